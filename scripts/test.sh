@@ -1,0 +1,16 @@
+#!/usr/bin/env bash
+# Builds everything and runs every test through CTest.
+# Installs missing Debian packages first; a second run only rebuilds what changed.
+#   VQM_BUILD_DIR   build folder (default: build)
+#   VQM_SANITIZE    "address,undefined" or "thread" for a sanitizer build
+set -euo pipefail
+top=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
+build=${VQM_BUILD_DIR:-$top/build}
+sanitize=${VQM_SANITIZE:-}
+
+source "$top/scripts/packages.sh"
+vqm_ensure_packages "${VQM_PACKAGES[@]}"
+
+cmake -S "$top" -B "$build" -G Ninja -DVQM_SANITIZE="$sanitize" >/dev/null
+cmake --build "$build" --parallel "$(nproc)"
+ctest --test-dir "$build" --output-on-failure --parallel "$(nproc)"
