@@ -44,8 +44,7 @@ int PackSeptets(const char* text, char* out, size_t outSize);
 // when it is 0 or more (the user-data length); with -1 every whole septet the octets
 // hold. Stops at the first character that is not a hexadecimal digit.
 // Returns the number of codes written.
-int UnpackSeptets(const char* hex, int hexLength, char* out, size_t outSize,
-                  int maxSeptets = -1);
+int UnpackSeptets(const char* hex, int hexLength, char* out, size_t outSize, int maxSeptets = -1);
 
 // Copies length ISO 8859-1 bytes into out as GSM codes (text-mode sending); bytes
 // without a code go as '?'. Returns the number written (no NUL is added).

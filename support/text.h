@@ -35,8 +35,7 @@ const char* ParseInt(const char* text, const char* end, int32_t* value);
 // stands between the quotes into out, NUL-terminated; a field longer than
 // outSize - 1 is cut. *length gets the number of characters copied. Returns a pointer
 // just past the closing quote, or nullptr when no complete quoted field is there.
-const char* ParseQuoted(const char* text, const char* end, char* out, size_t outSize,
-                        int* length);
+const char* ParseQuoted(const char* text, const char* end, char* out, size_t outSize, int* length);
 
 // Length of a NUL-terminated UTF-16 text, reading at most maxCount units.
 size_t WideLength(const char16_t* text, size_t maxCount);
