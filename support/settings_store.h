@@ -18,7 +18,7 @@ namespace vqm {
 std::string DefaultSettingsPath();
 
 class SettingsStore {
-public:
+  public:
     // Opens (creating the file and its folder when needed) the store at path.
     explicit SettingsStore(const std::string& path = DefaultSettingsPath());
     ~SettingsStore();
@@ -41,7 +41,7 @@ public:
     Type TypeOf(const char16_t* name);
     std::vector<Entry> List();
 
-private:
+  private:
     friend int GetSettingString(SettingsStore&, const char16_t*, char16_t*, size_t);
     friend int GetSettingInt(SettingsStore&, const char16_t*, int32_t*);
     friend int SetSettingString(SettingsStore&, const char16_t*, const char16_t*);
