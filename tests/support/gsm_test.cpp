@@ -103,7 +103,7 @@ TEST(Septets, EveryCodeAndEveryLengthRoundTrips) {
         ASSERT_EQ(digits, (length * 7 + 7) / 8 * 2);
         char out[200];
         ASSERT_EQ(UnpackSeptets(hex, digits, out, sizeof out, length), length);
-        EXPECT_EQ(std::memcmp(out, codes.data(), length), 0) << "length " << length;
+        EXPECT_EQ(std::vector<uint8_t>(out, out + length), codes) << "length " << length;
     }
     std::vector<uint8_t> all(128);
     for (int i = 0; i < 128; ++i)
