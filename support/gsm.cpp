@@ -2,6 +2,8 @@
 
 #include <array>
 
+#include "support/bounded_map.h"
+
 namespace vqm {
 
 namespace {
@@ -233,28 +235,16 @@ int Ucs2BytesToWide(const uint8_t* bytes, int byteCount, char16_t* out, size_t o
 }
 
 int GsmToDisplay(const char* gsm, int length, char* out, size_t outSize) {
-    if (!out || outSize == 0) return 0;
-    int written = 0;
-    if (gsm) {
-        for (int i = 0; i < length && static_cast<size_t>(written) + 1 < outSize; ++i) {
-            uint8_t code = static_cast<uint8_t>(gsm[i]);
-            int latin = code == 0x1B ? ' ' : GsmCodeToLatin(code);
-            out[written++] = static_cast<char>(latin >= 0 ? latin : '?');
-        }
-    }
-    out[written] = '\0';
-    return written;
+    return MapIntoBuffer(gsm, length, out, outSize, [](char c) {
+        uint8_t code = static_cast<uint8_t>(c);
+        int latin = code == 0x1B ? ' ' : GsmCodeToLatin(code);
+        return static_cast<char>(latin >= 0 ? latin : '?');
+    });
 }
 
 int GsmToWide(const char* gsm, int length, char16_t* out, size_t outSize) {
-    if (!out || outSize == 0) return 0;
-    int written = 0;
-    if (gsm) {
-        for (int i = 0; i < length && static_cast<size_t>(written) + 1 < outSize; ++i)
-            out[written++] = GsmCodeToWide(static_cast<uint8_t>(gsm[i]));
-    }
-    out[written] = u'\0';
-    return written;
+    return MapIntoBuffer(gsm, length, out, outSize,
+                         [](char c) { return GsmCodeToWide(static_cast<uint8_t>(c)); });
 }
 
 int CountForLimit(const char16_t* text, int count, char16_t* out, size_t outSize) {

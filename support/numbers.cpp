@@ -2,30 +2,20 @@
 
 #include <cstring>
 
+#include "support/bounded_map.h"
+#include "support/text.h"
+
 namespace vqm {
 
 int NarrowToWideZ(const char* narrow, size_t narrowSize, char16_t* wide, size_t wideSize) {
-    if (!wide || wideSize == 0) return 0;
-    int written = 0;
-    if (narrow) {
-        for (size_t i = 0;
-             i < narrowSize && narrow[i] != '\0' && static_cast<size_t>(written) + 1 < wideSize;
-             ++i)
-            wide[written++] = static_cast<unsigned char>(narrow[i]);
-    }
-    wide[written] = u'\0';
-    return written;
+    int length = narrow ? static_cast<int>(strnlen(narrow, narrowSize)) : 0;
+    return MapIntoBuffer(narrow, length, wide, wideSize, LatinToWide);
 }
 
 int WideToNarrowBounded(const char16_t* wide, char* narrow, size_t maxBytes) {
-    if (!narrow || maxBytes == 0) return 0;
-    int written = 0;
-    if (wide) {
-        for (size_t i = 0; wide[i] != u'\0' && static_cast<size_t>(written) + 1 < maxBytes; ++i)
-            narrow[written++] = wide[i] <= 0xFF ? static_cast<char>(wide[i]) : '?';
-    }
-    narrow[written] = '\0';
-    return written;
+    // Only as much of the source is measured as can be written.
+    int length = static_cast<int>(WideLength(wide, maxBytes > 0 ? maxBytes - 1 : 0));
+    return MapIntoBuffer(wide, length, narrow, maxBytes, LatinOrQuestionMark);
 }
 
 int NumbersMatch(const char* a, const char* b, int length) {

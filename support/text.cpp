@@ -3,30 +3,24 @@
 #include <climits>
 #include <cstring>
 
+#include "support/bounded_map.h"
+
 namespace vqm {
 
+char LatinOrQuestionMark(char16_t ch) {
+    return ch <= 0xFF ? static_cast<char>(ch) : '?';
+}
+
+char16_t LatinToWide(char ch) {
+    return static_cast<unsigned char>(ch);
+}
+
 int WideToNarrow(const char16_t* wide, char* narrow, int count, size_t narrowSize) {
-    if (!narrow || narrowSize == 0) return 0;
-    int written = 0;
-    if (wide) {
-        for (int i = 0; i < count && static_cast<size_t>(written) + 1 < narrowSize; ++i) {
-            char16_t ch = wide[i];
-            narrow[written++] = ch <= 0xFF ? static_cast<char>(ch) : '?';
-        }
-    }
-    narrow[written] = '\0';
-    return written;
+    return MapIntoBuffer(wide, count, narrow, narrowSize, LatinOrQuestionMark);
 }
 
 int NarrowToWide(const char* narrow, char16_t* wide, int count, size_t wideSize) {
-    if (!wide || wideSize == 0) return 0;
-    int written = 0;
-    if (narrow) {
-        for (int i = 0; i < count && static_cast<size_t>(written) + 1 < wideSize; ++i)
-            wide[written++] = static_cast<unsigned char>(narrow[i]);
-    }
-    wide[written] = u'\0';
-    return written;
+    return MapIntoBuffer(narrow, count, wide, wideSize, LatinToWide);
 }
 
 int FindPattern(int start, const char* pattern, int patternLength, const char* buffer,

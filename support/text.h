@@ -37,6 +37,10 @@ const char* ParseInt(const char* text, const char* end, int32_t* value);
 // just past the closing quote, or nullptr when no complete quoted field is there.
 const char* ParseQuoted(const char* text, const char* end, char* out, size_t outSize, int* length);
 
+// One character each way between UTF-16 and ISO 8859-1 ('?' where there is no 8-bit form).
+char LatinOrQuestionMark(char16_t ch);
+char16_t LatinToWide(char ch);
+
 // Length of a NUL-terminated UTF-16 text, reading at most maxCount units.
 size_t WideLength(const char16_t* text, size_t maxCount);
 
