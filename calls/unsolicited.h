@@ -1,0 +1,60 @@
+// The unsolicited codes the card mixes into its replies ("+CRING:", "+CLIP:", "+CMTI:"):
+// recognised in any text read from the port, queued in the event log, and handed one at a
+// time to the handler of their row.
+#pragma once
+
+#include <array>
+#include <chrono>
+#include <functional>
+
+#include "calls/event_log.h"
+
+namespace vqm {
+
+using EventHandler = std::function<int(const EventRecord&)>;
+
+struct UnsolicitedCode {
+    char tag[32];
+    int tagLength;
+};
+
+// Row order matters: it is the record's type and the order of the scan.
+inline constexpr std::array<UnsolicitedCode, 3> kUnsolicitedCodes = {{
+    {"+CRING:", 7},
+    {"+CLIP:", 6},
+    {"+CMTI:", 6},
+}};
+
+class UnsolicitedEvents {
+  public:
+    using Clock = std::function<std::chrono::system_clock::time_point()>;
+
+    explicit UnsolicitedEvents(EventLog& log, Clock now = std::chrono::system_clock::now)
+        : log_(log), now_(std::move(now)) {}
+
+    // Installs the handler of a row; a row without one is dispatched to nothing.
+    void SetHandler(EventType type, EventHandler handler);
+
+    // Queues one record per occurrence of each tag, row by row. Returns the result of the
+    // last append (1 when something was queued), else 0.
+    int UnsolicitedScan(const char* reply, int length);
+
+    // Calls the handler of the record's row; 0 when the row has none or the type is unknown.
+    int DispatchEvent(const EventRecord& record);
+
+    // Takes the oldest record off the queue and dispatches it; 0 when the queue was empty.
+    int DispatchOldest();
+
+    // Dispatches as many records as the queue held when called: records queued meanwhile
+    // wait for the next pass. Returns how many were dispatched.
+    int DispatchQueued();
+
+    EventLog& Log() { return log_; }
+
+  private:
+    EventLog& log_;
+    Clock now_;
+    std::array<EventHandler, kUnsolicitedCodes.size()> handlers_;
+};
+
+}  // namespace vqm
