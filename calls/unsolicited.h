@@ -8,6 +8,7 @@
 #include <functional>
 
 #include "calls/event_log.h"
+#include "link/event_sink.h"
 
 namespace vqm {
 
@@ -25,7 +26,7 @@ inline constexpr std::array<UnsolicitedCode, 3> kUnsolicitedCodes = {{
     {"+CMTI:", 6},
 }};
 
-class UnsolicitedEvents {
+class UnsolicitedEvents : public EventSink {
   public:
     using Clock = std::function<std::chrono::system_clock::time_point()>;
 
@@ -37,17 +38,17 @@ class UnsolicitedEvents {
 
     // Queues one record per occurrence of each tag, row by row. Returns the result of the
     // last append (1 when something was queued), else 0.
-    int UnsolicitedScan(const char* reply, int length);
+    int UnsolicitedScan(const char* reply, int length) override;
 
     // Calls the handler of the record's row; 0 when the row has none or the type is unknown.
     int DispatchEvent(const EventRecord& record);
 
     // Takes the oldest record off the queue and dispatches it; 0 when the queue was empty.
-    int DispatchOldest();
+    int DispatchOldest() override;
 
     // Dispatches as many records as the queue held when called: records queued meanwhile
     // wait for the next pass. Returns how many were dispatched.
-    int DispatchQueued();
+    int DispatchQueued() override;
 
     EventLog& Log() { return log_; }
 

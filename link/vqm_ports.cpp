@@ -1,0 +1,24 @@
+// vqm-ports: lists every active serial driver with its identity text and device, so that a
+// user can choose the "PnpId" that finds the card (vqm-settings set PnpId TEXT).
+#include <cstdio>
+#include <cstring>
+
+#include "link/ports.h"
+#include "support/settings_store.h"
+
+int main(int argc, char** argv) {
+    if (argc > 1 && (std::strcmp(argv[1], "--help") == 0 || std::strcmp(argv[1], "-h") == 0)) {
+        std::puts(
+            "Usage: vqm-ports\nLists the active serial drivers: key, identity, device.\n"
+            "The card is the first whose identity contains the PnpId setting.");
+        return 0;
+    }
+    vqm::SettingsStore settings;
+    const vqm::DriverRoots roots = vqm::DefaultDriverRoots();
+    char card[256] = "";
+    vqm::FindCardPort(settings, roots, card, sizeof card);
+    for (const vqm::ActiveDriver& driver : vqm::ListActiveDrivers(roots))
+        std::printf("%s\t%s\t%s%s\n", driver.key.c_str(), driver.pnpId.c_str(), driver.name.c_str(),
+                    driver.name == card ? "\t(the card)" : "");
+    return 0;
+}
