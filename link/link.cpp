@@ -46,6 +46,17 @@ const FinalResult kFinalResults[8] = {
     {"DELAYED\r", 8, 13},      {"ERROR\r", 6, 4}, {"NO ANSWER\r", 10, 8},  {"OK\r", 3, 0},
 };
 
+// Waits at most ms for a mutex that others hold only for an instant. A plain try-and-retry
+// rather than a timed mutex, whose clock-based wait the thread sanitizer cannot follow.
+bool LockWithin(std::mutex& mutex, int ms) {
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::milliseconds(ms);
+    while (!mutex.try_lock()) {
+        if (std::chrono::steady_clock::now() >= deadline) return false;
+        std::this_thread::sleep_for(std::chrono::microseconds(200));
+    }
+    return true;
+}
+
 void Sleep(Link& link, int ms) {
     if (link.sleepMs)
         link.sleepMs(ms);
@@ -250,7 +261,7 @@ int PortOpenDevice(Link& link, const char* device) {
 
 void PortClose(Link& link) {
     {
-        std::unique_lock<std::timed_mutex> lock(link.portMutex);
+        std::lock_guard<std::mutex> lock(link.portMutex);
         link.portState.store(0);
     }
     if (link.listener.joinable() && link.listener.get_id() != std::this_thread::get_id())
@@ -263,8 +274,8 @@ void PortClose(Link& link) {
 }
 
 int PortTryLock(Link& link) {
-    std::unique_lock<std::timed_mutex> lock(link.portMutex, std::defer_lock);
-    if (!lock.try_lock_for(std::chrono::milliseconds(kMutexWaitMs))) return 0;
+    if (!LockWithin(link.portMutex, kMutexWaitMs)) return 0;
+    std::lock_guard<std::mutex> lock(link.portMutex, std::adopt_lock);
     if (link.portState.load() != 1) return 0;
     link.portState.store(2);
     return 1;
@@ -273,7 +284,7 @@ int PortTryLock(Link& link) {
 int PortLock(Link& link) {
     for (;;) {
         {
-            std::lock_guard<std::timed_mutex> lock(link.portMutex);
+            std::lock_guard<std::mutex> lock(link.portMutex);
             int state = link.portState.load();
             if (state == 1) {
                 link.portState.store(2);
@@ -286,8 +297,8 @@ int PortLock(Link& link) {
 }
 
 void PortUnlock(Link& link) {
-    std::unique_lock<std::timed_mutex> lock(link.portMutex, std::defer_lock);
-    if (!lock.try_lock_for(std::chrono::milliseconds(kMutexWaitMs))) return;
+    if (!LockWithin(link.portMutex, kMutexWaitMs)) return;
+    std::lock_guard<std::mutex> lock(link.portMutex, std::adopt_lock);
     // A port closed meanwhile stays closed.
     if (link.portState.load() == 2) link.portState.store(1);
 }

@@ -34,9 +34,9 @@ struct Link {
     std::function<void(int ms)> sleepMs;          // the waits; tests may shorten them
 
     int fd = -1;
-    // Held only while testing and changing portState; a transaction owns the port while
-    // portState is 2, so a waiting party can give up without blocking for a whole exchange.
-    std::timed_mutex portMutex;
+    // Held only for the instant of testing and changing portState; a transaction owns the port
+    // while portState is 2, so a waiting party can give up without blocking for a whole exchange.
+    std::mutex portMutex;
     std::atomic<int> portState{0};  // 0 closed, 1 open and free, 2 in use
     float firmwareVersion = 0.0f;
 
