@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "support/settings_store.h"
+#include "tests/common/temp_folder.h"
 
 namespace vqm {
 namespace {
@@ -21,19 +22,13 @@ using std::chrono::system_clock;
 
 class EventLogTest : public ::testing::Test {
   protected:
-    void SetUp() override {
-        char pattern[] = "/tmp/vqm-events-XXXXXX";
-        folder_ = mkdtemp(pattern);
-        path_ = folder_ + "/event.log";
-    }
-    void TearDown() override { fs::remove_all(folder_); }
-
     EventRecord Record(uint8_t type, const std::string& line) {
         return MakeEventRecord(type, line.data(), line.data() + line.size(), system_clock::now());
     }
 
-    std::string folder_;
-    std::string path_;
+    const testing::TempFolder temp_;
+    const std::string folder_ = temp_.Path();
+    const std::string path_ = folder_ + "/event.log";
 };
 
 TEST_F(EventLogTest, RecordsComeOffInOrderAndLeaveNoFiles) {

@@ -1,5 +1,7 @@
 #include "calls/unsolicited.h"
 
+#include "tests/common/temp_folder.h"
+
 #include <gtest/gtest.h>
 #include <unistd.h>
 
@@ -10,21 +12,14 @@
 namespace vqm {
 namespace {
 
-std::string MakeTempFolder() {
-    char pattern[] = "/tmp/vqm-unsolicited-XXXXXX";
-    return mkdtemp(pattern);
-}
-
 class UnsolicitedTest : public ::testing::Test {
   protected:
-    ~UnsolicitedTest() override { std::filesystem::remove_all(folder_); }
-
     int Scan(const std::string& reply) {
         return events_.UnsolicitedScan(reply.data(), static_cast<int>(reply.size()));
     }
 
-    const std::string folder_ = MakeTempFolder();
-    EventLog log_{folder_ + "/event.log"};
+    const testing::TempFolder temp_;
+    EventLog log_{temp_ / "event.log"};
     UnsolicitedEvents events_{log_};
 };
 

@@ -15,17 +15,13 @@
 #include "fake_card.h"
 #include "link/operators.h"
 #include "support/settings_store.h"
+#include "tests/common/temp_folder.h"
 
 namespace vqm {
 namespace {
 
 namespace fs = std::filesystem;
 using testing::FakeCard;
-
-std::string MakeTempFolder() {
-    char pattern[] = "/tmp/vqm-link-XXXXXX";
-    return mkdtemp(pattern);
-}
 
 std::string Ok(const std::string& info = "") {
     return (info.empty() ? "" : "\r\n" + info + "\r\n") + "\r\nOK\r\n";
@@ -76,8 +72,6 @@ struct RecordingSink : EventSink {
 
 class LinkTest : public ::testing::Test {
   protected:
-    ~LinkTest() override { fs::remove_all(folder_); }
-
     std::unique_ptr<Link> OpenLink(FakeCard& card) {
         auto link =
             std::make_unique<Link>(settings_, DriverRoots{folder_ + "/run", folder_ + "/tty"});
@@ -96,7 +90,8 @@ class LinkTest : public ::testing::Test {
         return std::string(reply.data(), n);
     }
 
-    const std::string folder_ = MakeTempFolder();
+    const testing::TempFolder temp_;
+    const std::string folder_ = temp_.Path();
     SettingsStore settings_{folder_ + "/settings.db"};
     RecordingSink sink_;
 };

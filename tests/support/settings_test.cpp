@@ -12,6 +12,7 @@
 
 #include "support/settings_table.h"
 #include "support/text.h"
+#include "tests/common/temp_folder.h"
 
 namespace vqm {
 namespace {
@@ -20,15 +21,9 @@ namespace fs = std::filesystem;
 
 class SettingsTest : public ::testing::Test {
   protected:
-    void SetUp() override {
-        char pattern[] = "/tmp/vqm-settings-XXXXXX";
-        folder_ = mkdtemp(pattern);
-        path_ = folder_ + "/config/VQMFull/settings.db";
-    }
-    void TearDown() override { fs::remove_all(folder_); }
-
-    std::string folder_;
-    std::string path_;
+    const testing::TempFolder temp_;
+    const std::string folder_ = temp_.Path();
+    const std::string path_ = folder_ + "/config/VQMFull/settings.db";
 };
 
 TEST_F(SettingsTest, MissingNamesLeaveTheOutputAlone) {
