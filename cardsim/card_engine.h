@@ -1,0 +1,96 @@
+// The simulated card's AT engine: bytes in, bytes out, no I/O of its own. Time is handed in
+// by the caller (Tick), so tests drive dialling delays and ring repeats without sleeping.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <set>
+#include <string>
+#include <vector>
+
+namespace vqm::cardsim {
+
+using Clock = std::chrono::steady_clock;
+
+struct EngineConfig {
+    std::string firmware = "SW4.00";  // "SW3.80" and below send the caller's number unquoted
+    int signalQuality = 20;           // +CSQ, 0..31 or 99
+    int operatorCode = 20201;         // +COPS numeric
+    int dialDelayMs = 2000;           // from ATD until the far end decides
+    int ringRepeatMs = 3000;          // +CRING/+CLIP repeat while ringing
+    int ringTimeoutMs = 30000;        // the caller gives up
+};
+
+// Call states as AT+CLCC reports them.
+enum class CallState { None = -1, Active = 0, Dialing = 2, Alerting = 3, Incoming = 4 };
+
+class CardEngine {
+  public:
+    explicit CardEngine(EngineConfig config = {}) : config_(std::move(config)) {}
+
+    // Bytes from the dialer. Replies and echoes queue up for TakeOutput.
+    void Feed(const char* bytes, size_t length, Clock::time_point now);
+    // Advances the timers: dial outcomes, ring repeats, ring time-outs.
+    void Tick(Clock::time_point now);
+    std::string TakeOutput();
+
+    // The network side.
+    void Ring(const std::string& number, Clock::time_point now);
+    void CallerHangUp();  // an incoming call that stops ringing
+    void RemoteAnswer();  // the far end answers our outgoing call
+    void RemoteHangUp();  // the far end ends the call
+    void LocalAnswer();   // answered on the card's own controls
+    void SetBusy(const std::string& number) {
+        busy_.insert(number);
+        unanswered_.erase(number);
+    }
+    void SetUnanswered(const std::string& number) {
+        unanswered_.insert(number);
+        busy_.erase(number);
+    }
+    void SetReachable(const std::string& number) {
+        busy_.erase(number);
+        unanswered_.erase(number);
+    }
+    void SetSilent(bool silent) { silent_ = silent; }
+    void SendGarbage(size_t count);
+
+    EngineConfig& Config() { return config_; }
+    bool Echo() const { return echo_; }
+    int Volume() const { return volume_; }
+    CallState State() const { return state_; }
+    const std::string& CallNumber() const { return callNumber_; }
+    const std::vector<char>& DtmfSent() const { return dtmf_; }
+    float FirmwareVersion() const;
+
+  private:
+    void RunLine(const std::string& line, Clock::time_point now);
+    // One basic or extended command; returns false for an error.
+    bool RunCommand(const std::string& command, std::string& info, bool& deferred,
+                    Clock::time_point now);
+    void Result(const std::string& text);
+    void Unsolicited(const std::string& text);
+    void EndCall();
+
+    EngineConfig config_;
+    std::string input_;
+    std::string output_;
+    std::string pendingUnsolicited_;
+    bool echo_ = true;
+    bool silent_ = false;
+    bool commandRunning_ = false;  // a deferred ATD is waiting for the network
+    bool discardLine_ = false;     // the rest of a line that aborted a dial
+    int volume_ = 5;
+
+    CallState state_ = CallState::None;
+    bool outgoing_ = false;
+    std::string callNumber_;
+    Clock::time_point dialDecision_{};
+    Clock::time_point nextRing_{};
+    Clock::time_point ringGivesUp_{};
+    std::set<std::string> busy_, unanswered_;
+    std::vector<char> dtmf_;
+    unsigned garbageState_ = 12345;
+};
+
+}  // namespace vqm::cardsim
