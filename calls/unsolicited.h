@@ -33,7 +33,8 @@ class UnsolicitedEvents : public EventSink {
     explicit UnsolicitedEvents(EventLog& log, Clock now = std::chrono::system_clock::now)
         : log_(log), now_(std::move(now)) {}
 
-    // Installs the handler of a row; a row without one is dispatched to nothing.
+    // Installs the handler of a row; a row without one is dispatched to nothing. Handlers are
+    // installed before the link opens: the listener thread dispatches without a lock.
     void SetHandler(EventType type, EventHandler handler);
 
     // Queues one record per occurrence of each tag, row by row. Returns the result of the
