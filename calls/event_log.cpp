@@ -1,13 +1,11 @@
 #include "calls/event_log.h"
 
-#include <fcntl.h>
-#include <unistd.h>
-
 #include <cstdio>
 #include <cstring>
 #include <ctime>
 #include <vector>
 
+#include "support/files.h"
 #include "support/settings_store.h"
 #include "support/text.h"
 
@@ -22,12 +20,6 @@ void PutU16(unsigned char* at, uint16_t value) {
 
 uint16_t GetU16(const unsigned char* at) {
     return static_cast<uint16_t>(at[0] | (at[1] << 8));
-}
-
-// Pushes what stdio buffered down to the disk, so that a record reported written survives
-// a crash of the program or the machine.
-bool FlushToDisk(FILE* file) {
-    return std::fflush(file) == 0 && fsync(fileno(file)) == 0;
 }
 
 }  // namespace

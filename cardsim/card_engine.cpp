@@ -132,7 +132,7 @@ bool CardEngine::RunCommand(const std::string& command, std::string& info, bool&
     if (StartsWith(upper, "+CLVL=")) {
         int level;
         if (!NumberAfter(upper, 6, &level) || level < 0 || level > 10) return false;
-        volume_ = level;
+        SetVolume(level);
         return true;
     }
     if (upper == "+CLCC") {

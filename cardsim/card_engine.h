@@ -43,19 +43,36 @@ class CardEngine {
     void SetBusy(const std::string& number) {
         busy_.insert(number);
         unanswered_.erase(number);
+        ++revision_;
     }
     void SetUnanswered(const std::string& number) {
         unanswered_.insert(number);
         busy_.erase(number);
+        ++revision_;
     }
     void SetReachable(const std::string& number) {
         busy_.erase(number);
         unanswered_.erase(number);
+        ++revision_;
     }
     void SetSilent(bool silent) { silent_ = silent; }
     void SendGarbage(size_t count);
 
-    EngineConfig& Config() { return config_; }
+    // Settings that outlive a run change through ChangeConfig() or the setters; each change
+    // of kept state, from the dialer or the network side, moves Revision() on.
+    EngineConfig& ChangeConfig() {
+        ++revision_;
+        return config_;
+    }
+    const EngineConfig& Config() const { return config_; }
+    unsigned long Revision() const { return revision_; }
+    const std::set<std::string>& Busy() const { return busy_; }
+    const std::set<std::string>& Unanswered() const { return unanswered_; }
+    void SetVolume(int level) {
+        volume_ = level;
+        ++revision_;
+    }
+
     bool Echo() const { return echo_; }
     int Volume() const { return volume_; }
     CallState State() const { return state_; }
@@ -91,6 +108,7 @@ class CardEngine {
     std::set<std::string> busy_, unanswered_;
     std::vector<char> dtmf_;
     unsigned garbageState_ = 12345;
+    unsigned long revision_ = 0;
 };
 
 }  // namespace vqm::cardsim

@@ -9,11 +9,15 @@
 #include <fstream>
 #include <sstream>
 
+#include "support/files.h"
+
 namespace vqm::cardsim {
 
 namespace fs = std::filesystem;
 
-CardSim::CardSim(SimConfig config) : config_(std::move(config)), engine_(config_.engine) {}
+CardSim::CardSim(SimConfig config) : config_(std::move(config)), engine_(config_.engine) {
+    LoadState();
+}
 
 CardSim::~CardSim() {
     PowerDown();
@@ -26,6 +30,7 @@ std::string CardSim::DevicePath() const {
 
 bool CardSim::PowerUp() {
     if (Powered()) return true;
+    if (!inserted_) return false;
     int master = posix_openpt(O_RDWR | O_NOCTTY | O_CLOEXEC);
     if (master < 0 || grantpt(master) != 0 || unlockpt(master) != 0) {
         if (master >= 0) close(master);
@@ -92,6 +97,7 @@ void CardSim::Run() {
             if (n > 0) engine_.Feed(buffer, static_cast<size_t>(n), now);
             engine_.Tick(now);
             pending += engine_.TakeOutput();
+            if (engine_.Revision() != savedRevision_) SaveState();
         }
         while (!pending.empty() && !stop_) {
             const auto now = Clock::now();
@@ -112,13 +118,28 @@ std::string CardSim::Control(const std::string& line) {
     std::istringstream words(line);
     std::string command, argument;
     words >> command >> argument;
-    if (command == "pull" || command == "power-down") {
+    if (command == "pull") {
+        inserted_ = false;
         PowerDown();
-        return "OK";
+    } else if (command == "insert") {
+        inserted_ = true;  // back in its slot, powered down until the card manager powers it
+    } else if (command == "power-down") {
+        PowerDown();
+    } else if (command == "power-up") {
+        if (!inserted_) return "ERROR: no card inserted";
+        if (!PowerUp()) return "ERROR: no pseudo-terminal";
+    } else {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (command == "status") return "OK " + Status();
+        std::string result = ControlEngine(command, argument);
+        if (result != "OK") return result;
     }
-    if (command == "power-up" || command == "insert")
-        return PowerUp() ? "OK" : "ERROR: no pseudo-terminal";
     std::lock_guard<std::mutex> lock(mutex_);
+    SaveState();
+    return "OK";
+}
+
+std::string CardSim::ControlEngine(const std::string& command, const std::string& argument) {
     const auto now = Clock::now();
     auto needs = [&](const char* what) { return "ERROR: " + command + " needs " + what; };
     if (command == "ring") {
@@ -142,11 +163,15 @@ std::string CardSim::Control(const std::string& line) {
         char* end = nullptr;
         long value = std::strtol(argument.c_str(), &end, 10);
         if (argument.empty() || *end != '\0') return needs("a number");
-        (command == "signal" ? engine_.Config().signalQuality : engine_.Config().operatorCode) =
-            static_cast<int>(value);
+        if (command == "signal" && !((value >= 0 && value <= 31) || value == 99))
+            return needs("a quality from 0 to 31, or 99");
+        if (command == "operator" && (value < 100 || value > 999999))
+            return needs("a network code such as 20201");
+        (command == "signal" ? engine_.ChangeConfig().signalQuality
+                             : engine_.ChangeConfig().operatorCode) = static_cast<int>(value);
     } else if (command == "firmware") {
         if (argument.empty()) return needs("a version such as SW3.80");
-        engine_.Config().firmware = argument.rfind("SW", 0) == 0 ? argument : "SW" + argument;
+        engine_.ChangeConfig().firmware = argument.rfind("SW", 0) == 0 ? argument : "SW" + argument;
     } else if (command == "silent") {
         if (argument != "on" && argument != "off") return needs("on or off");
         engine_.SetSilent(argument == "on");
@@ -158,6 +183,89 @@ std::string CardSim::Control(const std::string& line) {
         return "ERROR: unknown command '" + command + "'";
     }
     return "OK";
+}
+
+std::string CardSim::Status() const {
+    static const char* const kStates[] = {"active", "held", "dialing", "alerting", "incoming"};
+    const int state = static_cast<int>(engine_.State());
+    const EngineConfig& config = engine_.Config();
+    std::ostringstream out;
+    out << "inserted=" << (inserted_ ? 1 : 0) << " powered=" << (master_ >= 0 ? 1 : 0)
+        << " call=" << (state < 0 ? "none" : kStates[state]);
+    if (!engine_.CallNumber().empty()) out << " number=" << engine_.CallNumber();
+    out << " signal=" << config.signalQuality << " operator=" << config.operatorCode
+        << " firmware=" << config.firmware << " volume=" << engine_.Volume()
+        << " device=" << (slavePath_.empty() ? "-" : slavePath_);
+    return out.str();
+}
+
+std::string CardSim::RunScript(const std::string& script, const std::function<void(int)>& wait) {
+    std::istringstream lines(script);
+    std::string line;
+    for (int number = 1; std::getline(lines, line); ++number) {
+        std::istringstream words(line);
+        std::string command, argument;
+        words >> command >> argument;
+        if (command.empty() || command[0] == '#') continue;
+        std::string result;
+        if (command == "wait") {
+            char* end = nullptr;
+            long ms = std::strtol(argument.c_str(), &end, 10);
+            if (argument.empty() || *end != '\0' || ms < 0) {
+                result = "ERROR: wait needs milliseconds";
+            } else if (wait) {
+                wait(static_cast<int>(ms));
+            } else {
+                std::this_thread::sleep_for(std::chrono::milliseconds(ms));
+            }
+        } else {
+            result = Control(line);
+        }
+        if (result.rfind("ERROR", 0) == 0) return "line " + std::to_string(number) + ": " + result;
+    }
+    return "OK";
+}
+
+// The kept state is a small text file, one "name value" a line, so that a user can read it
+// and a damaged line costs only its own value.
+void CardSim::LoadState() {
+    if (config_.stateFile.empty()) return;
+    std::ifstream file(config_.stateFile);
+    std::string line;
+    while (std::getline(file, line)) {
+        std::istringstream words(line);
+        std::string name, value;
+        words >> name >> value;
+        if (value.empty()) continue;
+        const long number = std::strtol(value.c_str(), nullptr, 10);
+        EngineConfig& config = engine_.ChangeConfig();
+        if (name == "inserted") inserted_ = number != 0;
+        if (name == "firmware") config.firmware = value;
+        if (name == "signal") config.signalQuality = static_cast<int>(number);
+        if (name == "operator") config.operatorCode = static_cast<int>(number);
+        if (name == "volume" && number >= 0 && number <= 10)
+            engine_.SetVolume(static_cast<int>(number));
+        if (name == "busy") engine_.SetBusy(value);
+        if (name == "unanswered") engine_.SetUnanswered(value);
+    }
+    savedRevision_ = engine_.Revision();
+}
+
+void CardSim::SaveState() {
+    savedRevision_ = engine_.Revision();
+    if (config_.stateFile.empty()) return;
+    const EngineConfig& config = engine_.Config();
+    std::ostringstream out;
+    out << "inserted " << (inserted_ ? 1 : 0) << "\nfirmware " << config.firmware << "\nsignal "
+        << config.signalQuality << "\noperator " << config.operatorCode << "\nvolume "
+        << engine_.Volume() << "\n";
+    for (const std::string& number : engine_.Busy())
+        out << "busy " << number << "\n";
+    for (const std::string& number : engine_.Unanswered())
+        out << "unanswered " << number << "\n";
+    std::error_code error;
+    fs::create_directories(fs::path(config_.stateFile).parent_path(), error);
+    ReplaceFile(config_.stateFile, out.str());
 }
 
 }  // namespace vqm::cardsim

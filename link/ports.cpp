@@ -1,13 +1,12 @@
 #include "link/ports.h"
 
-#include <unistd.h>
 
 #include <algorithm>
-#include <cstdlib>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
 
+#include "support/local_socket.h"
 #include "support/settings_store.h"
 #include "support/text.h"
 
@@ -71,10 +70,7 @@ bool FindCard(SettingsStore& settings, const DriverRoots& roots, ActiveDriver* f
 }  // namespace
 
 DriverRoots DefaultDriverRoots() {
-    const char* runtime = std::getenv("XDG_RUNTIME_DIR");
-    std::string root = runtime && *runtime ? std::string(runtime) + "/VQMFull"
-                                           : "/tmp/vqm-" + std::to_string(getuid()) + "/VQMFull";
-    return DriverRoots{root, "/sys/class/tty"};
+    return DriverRoots{DefaultRuntimeRoot(), "/sys/class/tty"};
 }
 
 std::vector<ActiveDriver> ListActiveDrivers(const DriverRoots& roots) {

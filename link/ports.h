@@ -18,7 +18,7 @@ namespace vqm {
 class SettingsStore;
 
 struct DriverRoots {
-    std::string runtimeRoot;  // $XDG_RUNTIME_DIR/VQMFull, else /tmp/vqm-<uid>/VQMFull
+    std::string runtimeRoot;  // DefaultRuntimeRoot()
     std::string sysClassTty;  // /sys/class/tty
 };
 DriverRoots DefaultDriverRoots();

@@ -52,7 +52,7 @@ TEST_F(EngineTest, QueriesAnswerWithInformationLines) {
     EXPECT_EQ(Send("AT+CLVL?\r"), "\r\n+CLVL: 8\r\n\r\nOK\r\n");
     EXPECT_EQ(Send("AT+CLVL=11\r"), "\r\nERROR\r\n");
     EXPECT_EQ(Send("AT+CLCC\r"), "\r\nOK\r\n");  // no call
-    engine_.Config().firmware = "SW3.80";
+    engine_.ChangeConfig().firmware = "SW3.80";
     EXPECT_FLOAT_EQ(engine_.FirmwareVersion(), 3.8f);
 }
 
@@ -122,11 +122,11 @@ TEST_F(EngineTest, IncomingCallRingsUntilAnsweredOrGivenUp) {
 }
 
 TEST_F(EngineTest, CallerNumberQuotingFollowsTheFirmware) {
-    engine_.Config().firmware = "SW3.81";
+    engine_.ChangeConfig().firmware = "SW3.81";
     engine_.Ring("0123", now_);
     EXPECT_NE(engine_.TakeOutput().find("\r\n+CLIP: 0123,129\r\n"), std::string::npos);
     engine_.CallerHangUp();
-    engine_.Config().firmware = "SW3.82";
+    engine_.ChangeConfig().firmware = "SW3.82";
     engine_.Ring("0123", now_);
     EXPECT_NE(engine_.TakeOutput().find("\r\n+CLIP: \"0123\",129\r\n"), std::string::npos);
 }

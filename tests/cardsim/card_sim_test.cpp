@@ -100,15 +100,6 @@ TEST_F(CardSimTest, RingReachesItsHandlerOnce) {
     EXPECT_EQ(callerLine, "+CLIP: \"+447700900123\",145");
 }
 
-TEST_F(CardSimTest, ControlCommandsAreChecked) {
-    CardSim sim(Config(0));
-    EXPECT_EQ(sim.Control("dance"), "ERROR: unknown command 'dance'");
-    EXPECT_NE(sim.Control("ring").find("ERROR"), std::string::npos);
-    EXPECT_NE(sim.Control("signal loud").find("ERROR"), std::string::npos);
-    EXPECT_EQ(sim.Control("busy 0123"), "OK");
-    EXPECT_EQ(sim.Control("firmware 3.80"), "OK");
-}
-
 TEST_F(CardSimTest, OutputIsPacedAtTheLineRate) {
     CardSim sim(Config(19200));
     ASSERT_TRUE(sim.PowerUp());

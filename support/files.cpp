@@ -1,0 +1,22 @@
+#include "support/files.h"
+
+#include <unistd.h>
+
+namespace vqm {
+
+bool FlushToDisk(FILE* file) {
+    return std::fflush(file) == 0 && fsync(fileno(file)) == 0;
+}
+
+bool ReplaceFile(const std::string& path, const std::string& data) {
+    const std::string tmpPath = path + ".tmp";
+    FILE* tmp = std::fopen(tmpPath.c_str(), "wb");
+    if (!tmp) return false;
+    bool ok = std::fwrite(data.data(), 1, data.size(), tmp) == data.size() && FlushToDisk(tmp);
+    ok = std::fclose(tmp) == 0 && ok;
+    if (ok && std::rename(tmpPath.c_str(), path.c_str()) == 0) return true;
+    std::remove(tmpPath.c_str());
+    return false;
+}
+
+}  // namespace vqm

@@ -1,0 +1,17 @@
+// Writing files so that a crash of the program or the machine leaves the old contents or the
+// new ones, never a mixture.
+#pragma once
+
+#include <cstdio>
+#include <string>
+
+namespace vqm {
+
+// Pushes what stdio buffered down to the disk, so that data reported written survives a
+// crash of the program or the machine.
+bool FlushToDisk(FILE* file);
+
+// Writes data to "<path>.tmp", flushes it to disk and renames it over path.
+bool ReplaceFile(const std::string& path, const std::string& data);
+
+}  // namespace vqm

@@ -1,0 +1,150 @@
+// vqm-cardsim run as a user runs it: a separate process, its sockets, its control client.
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <cstdio>
+#include <filesystem>
+#include <fstream>
+#include <thread>
+
+#include "cardsim/card_sim.h"
+#include "link/link.h"
+#include "support/local_socket.h"
+#include "support/settings_store.h"
+#include "tests/common/temp_folder.h"
+
+namespace vqm::cardsim {
+namespace {
+
+namespace fs = std::filesystem;
+using namespace std::chrono_literals;
+
+// Output and exit status of a shell command.
+std::pair<std::string, int> RunShell(const std::string& command) {
+    std::string output;
+    FILE* pipe = popen((command + " 2>&1").c_str(), "r");
+    char buffer[512];
+    while (pipe && std::fgets(buffer, sizeof buffer, pipe))
+        output += buffer;
+    int status = pipe ? pclose(pipe) : -1;
+    return {output, WIFEXITED(status) ? WEXITSTATUS(status) : -1};
+}
+
+template <typename Condition>
+bool WaitFor(Condition condition, std::chrono::milliseconds limit = 5000ms) {
+    const auto end = std::chrono::steady_clock::now() + limit;
+    while (!condition()) {
+        if (std::chrono::steady_clock::now() > end) return false;
+        std::this_thread::sleep_for(10ms);
+    }
+    return true;
+}
+
+class ProgramTest : public ::testing::Test {
+  protected:
+    ~ProgramTest() override { Stop(); }
+
+    void Start(const std::string& extra = "") {
+        const std::string command = std::string(VQM_CARDSIM) + " --baud 0 --power-up-ms 300" +
+                                    " --runtime-dir " + run_ + " --state-dir " + (temp_ / "state") +
+                                    " " + extra;
+        pid_ = fork();
+        if (pid_ == 0) {
+            execl("/bin/sh", "sh", "-c", ("exec " + command + " >/dev/null").c_str(), nullptr);
+            _exit(127);
+        }
+        ASSERT_TRUE(WaitFor([&] { return ServerAnswers(ControlPath()); }));
+    }
+    int Stop() {
+        if (pid_ <= 0) return -1;
+        kill(pid_, SIGTERM);
+        int status = 0;
+        waitpid(pid_, &status, 0);
+        pid_ = -1;
+        return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+    }
+    std::string ControlPath() const { return run_ + "/cardsim.ctl"; }
+    std::string CompanionPath() const { return WindowSocketPath(run_, kCompanionClass); }
+    std::pair<std::string, int> Ctl(const std::string& command) {
+        return RunShell(std::string(VQM_CARDSIM) + " --runtime-dir " + run_ + " ctl " + command);
+    }
+
+    const vqm::testing::TempFolder temp_;
+    const std::string run_ = temp_ / "run";
+    pid_t pid_ = -1;
+};
+
+TEST_F(ProgramTest, HelpAndBadOptions) {
+    auto [help, status] = RunShell(std::string(VQM_CARDSIM) + " --help");
+    EXPECT_EQ(status, 0);
+    EXPECT_NE(help.find("--power-up-ms"), std::string::npos);
+    EXPECT_NE(help.find("remote-hangup"), std::string::npos);
+    EXPECT_EQ(RunShell(std::string(VQM_CARDSIM) + " --baud fast").second, 2);
+    EXPECT_EQ(RunShell(std::string(VQM_CARDSIM) + " --script /nonexistent").second, 2);
+    auto [noCard, ctlStatus] = Ctl("status");
+    EXPECT_EQ(ctlStatus, 2);
+    EXPECT_NE(noCard.find("no simulated card is running"), std::string::npos);
+}
+
+TEST_F(ProgramTest, TheDialerPowersItUpThroughTheCardManagerAndTalksToIt) {
+    Start();
+    EXPECT_EQ(SendWindowMessage(CompanionPath(), kMsgCardPowerQuery, 0, 0), 0L);
+    EXPECT_EQ(SendWindowMessage(CompanionPath(), kMsgCardPowerUp, 0, 0), 1L);
+    EXPECT_EQ(SendWindowMessage(CompanionPath(), kMsgCardPowerQuery, 0, 0), 2L);
+    ASSERT_TRUE(WaitFor(
+        [&] { return SendWindowMessage(CompanionPath(), kMsgCardPowerQuery, 0, 0) == 1L; }));
+
+    SettingsStore settings(temp_ / "settings.db");
+    SetSettingString(settings, u"PnpId", u"TAVRO_CARD_PHONE");
+    Link link(settings, DriverRoots{run_, temp_ / "no-tty"});
+    ASSERT_EQ(PortOpen(link), 1);
+    EXPECT_FLOAT_EQ(link.firmwareVersion, 4.0f);
+
+    EXPECT_EQ(Ctl("signal 30").second, 0);
+    EXPECT_EQ(Ctl("signal 300"), std::make_pair(std::string("ERROR: signal needs a quality from "
+                                                            "0 to 31, or 99\n"),
+                                                1));
+    int bars = -1;
+    ASSERT_TRUE(WaitFor([&] { return (bars = GetSignalBars(link)) != -1; }));
+    EXPECT_EQ(bars, 3);
+
+    // Pulled: the transaction fails at once and the manager reports the card powered down.
+    EXPECT_EQ(Ctl("pull").second, 0);
+    char reply[64];
+    EXPECT_EQ(AtCommand(link, "AT\r", reply, sizeof reply), 0u);
+    EXPECT_EQ(SendWindowMessage(CompanionPath(), kMsgCardPowerQuery, 0, 0), 0L);
+    PortClose(link);
+
+    EXPECT_EQ(Stop(), 0);
+    EXPECT_FALSE(fs::exists(ControlPath()));
+    EXPECT_FALSE(fs::exists(CompanionPath()));
+    EXPECT_FALSE(fs::exists(run_ + "/Drivers/Active/vqm-cardsim"));
+}
+
+TEST_F(ProgramTest, ScriptsRunAtStartAndStateOutlivesTheRun) {
+    std::ofstream(temp_ / "script") << "# the demo network\nbusy 0800\nwait 50\noperator 23410\n";
+    Start("--powered --firmware SW3.80 --script " + (temp_ / "script"));
+    EXPECT_TRUE(fs::exists(run_ + "/Drivers/Active/vqm-cardsim/Name"));
+    std::string status;
+    ASSERT_TRUE(WaitFor([&] {
+        return (status = Ctl("status").first).find("23410") != std::string::npos;
+    })) << status;
+    EXPECT_NE(status.find("powered=1"), std::string::npos);
+    EXPECT_NE(status.find("firmware=SW3.80"), std::string::npos);
+
+    // A second card cannot take the same sockets.
+    EXPECT_EQ(RunShell(std::string(VQM_CARDSIM) + " --runtime-dir " + run_).second, 1);
+    EXPECT_EQ(Stop(), 0);
+
+    Start();
+    status = Ctl("status").first;
+    EXPECT_NE(status.find("powered=0"), std::string::npos) << status;
+    EXPECT_NE(status.find("operator=23410 firmware=SW3.80"), std::string::npos) << status;
+}
+
+}  // namespace
+}  // namespace vqm::cardsim
