@@ -144,6 +144,14 @@ int main(int argc, char** argv) {
     vqm::LineServer companionServer, controlServer;
     const std::string companionPath =
         vqm::WindowSocketPath(config.runtimeDir, vqm::kCompanionClass);
+    if (vqm::ServerAnswers(companionPath)) {
+        std::fprintf(stderr, "vqm-cardsim: a card manager already answers at %s\n",
+                     companionPath.c_str());
+        return 1;
+    }
+    // Powered before the sockets answer, so that whoever finds them finds the card as asked.
+    if (powered && !card.PowerUp())
+        std::fprintf(stderr, "vqm-cardsim: cannot power up (card pulled, or no pseudo-terminal)\n");
     if (!companionServer.Start(companionPath, [&](const std::string& line) {
             return vqm::AnswerWindowMessage(line, [&](unsigned msg, long w, long l) {
                 return companion.OnMessage(msg, w, l, Clock::now());
@@ -159,8 +167,6 @@ int main(int argc, char** argv) {
                      ControlSocketPath(config.runtimeDir).c_str());
         return 1;
     }
-    if (powered && !card.PowerUp())
-        std::fprintf(stderr, "vqm-cardsim: cannot power up (card pulled, or no pseudo-terminal)\n");
 
     std::mutex stopMutex;
     std::condition_variable stopped;
