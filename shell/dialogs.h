@@ -1,0 +1,37 @@
+// Message boxes and dialogs. Every box and dialog goes through one Dialogs object, so that a
+// test can install a responder that records each one and answers it instead of a person.
+#pragma once
+
+#include <functional>
+#include <string>
+
+class QDialog;
+class QWidget;
+
+namespace vqm {
+
+struct DialogRequest {
+    std::u16string text;  // a box's text, or a dialog's object name
+    std::u16string title;
+    unsigned style = 0;  // a box's style bits; 0 for dialogs
+    bool isDialog = false;
+    QDialog* dialog = nullptr;  // the dialog, built and ready, for a responder to look at
+};
+
+class Dialogs {
+  public:
+    using Responder = std::function<int(const DialogRequest&)>;
+
+    // A box with the text, title, buttons (OK, OK/Cancel, Yes/No ...) and icon of its style.
+    // Returns the button's id (1 OK, 2 Cancel, 6 Yes, 7 No).
+    int MessageBox(QWidget* parent, const std::u16string& text, const std::u16string& title,
+                   unsigned style);
+    // Runs a dialog modally and returns its result.
+    int Run(QDialog* dialog);
+    void SetResponder(Responder responder) { responder_ = std::move(responder); }
+
+  private:
+    Responder responder_;
+};
+
+}  // namespace vqm

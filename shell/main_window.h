@@ -1,0 +1,125 @@
+// The main window: the frame of the seven views, the menu bar with the view buttons and the
+// File and Help menus, the tray icon, the card watch's timer and the display key.
+#pragma once
+
+#include <QSystemTrayIcon>
+#include <QTimer>
+#include <QWidget>
+#include <array>
+#include <chrono>
+#include <functional>
+#include <memory>
+
+#include "shell/card_watch.h"
+#include "shell/display_power.h"
+#include "shell/message_layer.h"
+#include "shell/views.h"
+
+class QMenu;
+class QToolBar;
+
+namespace vqm {
+
+struct Link;
+class Dialogs;
+class Notifier;
+class SettingsStore;
+
+inline constexpr int kViewCount = 7;
+inline constexpr int kViewDialPad = 0, kViewWriteSms = 1, kViewSmsFolder = 2,
+                     kViewManageContacts = 3, kViewSettings = 4, kViewCallLog = 5,
+                     kViewContacts = 6;
+// The key that stands in for the handheld's display key: it switches the display off and on
+// while the dialer's window is active.
+inline constexpr Qt::Key kDisplayKey = Qt::Key_F9;
+
+// Everything the main window and the views share, made once by the program.
+struct ShellContext {
+    SettingsStore& settings;
+    Link& link;
+    Dialogs& dialogs;
+    std::string runtimeRoot;
+    MessageLayer* messages = nullptr;  // set by the main window
+    class MainWindow* mainWindow = nullptr;
+};
+
+using ViewFactory = std::function<View*(QWidget* parent, ShellContext& context)>;
+
+// The views that this build has; a view still to come is an empty window of its class.
+std::array<ViewFactory, kViewCount> DefaultViewFactories();
+
+class MainWindow : public QWidget, public MessageTarget, public ShellUi {
+  public:
+    // card may be given by tests; otherwise the window talks to the card manager's socket.
+    MainWindow(ShellContext& context, std::array<ViewFactory, kViewCount> factories,
+               CardHost* card = nullptr);
+    ~MainWindow() override;
+
+    long OnMessage(unsigned msg, long wParam, long lParam) override;
+    // The same as a WM_COMMAND with the id in the low word.
+    void Command(int id) { OnMessage(273, id, 0); }
+
+    // ShellUi
+    int MessageBox(const std::u16string& text, const std::u16string& title,
+                   unsigned style) override;
+    void ShowStatus(const std::u16string& first, const std::u16string& second) override;
+    void Foreground() override;
+    void UpdateWindow() override;
+    void SetBusyLook(bool busy) override;
+    void SetTrayIcon(int icon) override;
+    void EnableViewButton(int index, bool enable) override;
+    void ShowDialPad() override;
+    void SendToViews(unsigned msg, long wParam, long lParam) override;
+
+    AppState& App() { return app_; }
+    ViewSet& Views() { return views_; }
+    const ViewButtons& Buttons() const { return buttons_; }
+    MessageLayer& Messages() { return messages_; }
+    BusyIndicator& Busy() { return busy_; }
+    CardWatch& Watch() { return watch_; }
+    Notifier& Notifications() { return *notifier_; }
+    int TrayIconId() const { return trayIcon_; }
+    // When ShowStatus last ran.
+    std::chrono::steady_clock::time_point StatusShownAt() const { return statusShownAt_; }
+    View* ViewAt(int index) const;
+    // Stops the card watch's timer (tests drive the watch by hand).
+    void StopWatchTimer() { watchTimer_.stop(); }
+
+  protected:
+    void paintEvent(QPaintEvent* event) override;
+    void resizeEvent(QResizeEvent* event) override;
+    void keyPressEvent(QKeyEvent* event) override;
+    void changeEvent(QEvent* event) override;
+    void closeEvent(QCloseEvent* event) override;
+
+  private:
+    void BuildMenuBar();
+    void CreateViews(std::array<ViewFactory, kViewCount>& factories);
+    void OnCommand(int id);
+    void OnWatchTimer();
+    void ShowTrayMenu();
+    void ShowAbout();
+    void Shutdown();
+
+    ShellContext& context_;
+    MessageLayer messages_;
+    AppState app_;
+    std::unique_ptr<CardHost> ownCardHost_;
+    CardHost& card_;
+    BusyIndicator busy_{*this};
+    CardWatch watch_;
+    DisplayPower display_;
+    ViewSet views_;
+    ViewButtons buttons_{};
+    QToolBar* menuBar_ = nullptr;
+    QAction* offDisplay_ = nullptr;
+    QMenu* trayMenu_ = nullptr;
+    QSystemTrayIcon* tray_ = nullptr;
+    int trayIcon_ = 0;
+    Notifier* notifier_ = nullptr;
+    QTimer watchTimer_;
+    std::chrono::steady_clock::time_point statusShownAt_{};
+    bool shutDown_ = false;
+};
+
+}  // namespace vqm
