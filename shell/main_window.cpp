@@ -128,11 +128,11 @@ MainWindow::~MainWindow() {
 
 void MainWindow::BuildMenuBar() {
     menuBar_ = new QToolBar(this);
-    menuBar_->setIconSize(QSize(20, 20));
+    menuBar_->setIconSize(QSize(18, 18));
     menuBar_->setMovable(false);
     menuBar_->setStyleSheet(
         "QToolBar { background: #dde3ec; border-top: 1px solid #9aa5b5; "
-        "spacing: 0px; padding: 0px; } QToolButton { padding: 1px; }");
+        "spacing: 0px; padding: 0px; } QToolButton { padding: 0px 1px; margin: 0px; }");
 
     auto* file = new QMenu("File", this);
     offDisplay_ = file->addAction("Off Display", this, [this] { Command(kCmdOffDisplay); });
@@ -343,9 +343,9 @@ void MainWindow::ShowStatus(const std::u16string& first, const std::u16string& s
     View* dialPad = ViewAt(kViewDialPad);
     if (auto* line = qobject_cast<QLabel*>(FindControl(dialPad, kStatusFirstId)))
         line->setText(QString::fromStdU16String(first));
-    if (!second.empty())
-        if (auto* line = qobject_cast<QLabel*>(FindControl(dialPad, kStatusSecondId)))
-            line->setText(QString::fromStdU16String(second));
+    // An empty second line is not shown: nothing of an earlier status stays under the first.
+    if (auto* line = qobject_cast<QLabel*>(FindControl(dialPad, kStatusSecondId)))
+        line->setText(QString::fromStdU16String(second));
     statusShownAt_ = std::chrono::steady_clock::now();
 }
 
