@@ -14,6 +14,7 @@
 #include <cstring>
 
 #include "link/operators.h"
+#include "support/lock_within.h"
 #include "support/text.h"
 
 namespace vqm {
@@ -45,17 +46,6 @@ const FinalResult kFinalResults[8] = {
     {"BLACKLISTED\r", 12, 14}, {"BUSY\r", 5, 7},  {"NO CARRIER\r", 11, 3}, {"CARRIER\r", 8, 16},
     {"DELAYED\r", 8, 13},      {"ERROR\r", 6, 4}, {"NO ANSWER\r", 10, 8},  {"OK\r", 3, 0},
 };
-
-// Waits at most ms for a mutex that others hold only for an instant. A plain try-and-retry
-// rather than a timed mutex, whose clock-based wait the thread sanitizer cannot follow.
-bool LockWithin(std::mutex& mutex, int ms) {
-    const auto deadline = std::chrono::steady_clock::now() + std::chrono::milliseconds(ms);
-    while (!mutex.try_lock()) {
-        if (std::chrono::steady_clock::now() >= deadline) return false;
-        std::this_thread::sleep_for(std::chrono::microseconds(200));
-    }
-    return true;
-}
 
 void Sleep(Link& link, int ms) {
     if (link.sleepMs)

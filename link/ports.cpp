@@ -1,7 +1,7 @@
 #include "link/ports.h"
 
-
 #include <algorithm>
+#include <cstdio>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
@@ -99,6 +99,14 @@ int FindCardPort(SettingsStore& settings, const DriverRoots& roots, char* name, 
     if (!name || !FindCard(settings, roots, &driver) || driver.name.size() + 1 > nameSize) return 0;
     std::memcpy(name, driver.name.c_str(), driver.name.size() + 1);
     return 1;
+}
+
+void PrintActiveDrivers(SettingsStore& settings, const DriverRoots& roots) {
+    char card[256] = "";
+    FindCardPort(settings, roots, card, sizeof card);
+    for (const ActiveDriver& driver : ListActiveDrivers(roots))
+        std::printf("%s\t%s\t%s%s\n", driver.key.c_str(), driver.pnpId.c_str(), driver.name.c_str(),
+                    driver.name == card ? "\t(the card)" : "");
 }
 
 }  // namespace vqm

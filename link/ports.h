@@ -33,6 +33,8 @@ std::vector<ActiveDriver> ListActiveDrivers(const DriverRoots& roots);
 
 // 1 when the card's driver is active.
 int CardPresent(SettingsStore& settings, const DriverRoots& roots);
+// Prints every active driver as "key<TAB>identity<TAB>device", marking the card's.
+void PrintActiveDrivers(SettingsStore& settings, const DriverRoots& roots);
 // Writes the card's device name (NUL-terminated, within nameSize) and returns 1, or 0.
 int FindCardPort(SettingsStore& settings, const DriverRoots& roots, char* name, size_t nameSize);
 

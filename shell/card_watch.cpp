@@ -4,6 +4,7 @@
 
 #include "shell/messages.h"
 #include "support/local_socket.h"  // the card manager's message numbers
+#include "support/lock_within.h"
 #include "support/settings_store.h"
 
 namespace vqm {
@@ -13,15 +14,6 @@ namespace {
 constexpr int kBusyWaitMs = 500;
 constexpr int kCompanionBusySleepMs = 5000;
 constexpr int kViewWriteSms = 1, kViewSettings = 4;
-
-bool LockWithin(std::mutex& mutex, int ms) {
-    const auto deadline = std::chrono::steady_clock::now() + std::chrono::milliseconds(ms);
-    while (!mutex.try_lock()) {
-        if (std::chrono::steady_clock::now() >= deadline) return false;
-        std::this_thread::sleep_for(std::chrono::microseconds(200));
-    }
-    return true;
-}
 
 }  // namespace
 

@@ -28,12 +28,7 @@ constexpr char kUsage[] =
 
 int ListPorts() {
     vqm::SettingsStore settings;
-    const vqm::DriverRoots roots = vqm::DefaultDriverRoots();
-    char card[256] = "";
-    vqm::FindCardPort(settings, roots, card, sizeof card);
-    for (const vqm::ActiveDriver& driver : vqm::ListActiveDrivers(roots))
-        std::printf("%s\t%s\t%s%s\n", driver.key.c_str(), driver.pnpId.c_str(), driver.name.c_str(),
-                    driver.name == card ? "\t(the card)" : "");
+    vqm::PrintActiveDrivers(settings, vqm::DefaultDriverRoots());
     return 0;
 }
 
