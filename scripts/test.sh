@@ -13,4 +13,7 @@ vqm_ensure_packages "${VQM_PACKAGES[@]}"
 
 cmake -S "$top" -B "$build" -G Ninja -DVQM_SANITIZE="$sanitize" >/dev/null
 cmake --build "$build" --parallel "$(nproc)"
+if [ "$sanitize" = thread ]; then
+    export TSAN_OPTIONS="suppressions=$top/scripts/tsan.supp ${TSAN_OPTIONS:-}"
+fi
 ctest --test-dir "$build" --output-on-failure --parallel "$(nproc)"
