@@ -48,6 +48,10 @@ void CardEngine::Feed(const char* bytes, size_t length, Clock::time_point now) {
             EndCall();
             Result("NO CARRIER");
         }
+        if (prompting_) {
+            RunPromptByte(c);
+            continue;
+        }
         if (discardLine_) {
             if (c == '\r') discardLine_ = false;
             continue;
@@ -60,6 +64,28 @@ void CardEngine::Feed(const char* bytes, size_t length, Clock::time_point now) {
         } else if (c != '\n' && input_.size() < kMaxLine) {
             input_.push_back(c);
         }
+    }
+}
+
+// Text typed after a "> " prompt: Ctrl-Z hands it over, Esc cancels it.
+void CardEngine::RunPromptByte(char c) {
+    constexpr char kCtrlZ = 0x1A, kEscape = 0x1B;
+    constexpr size_t kMaxPromptText = 4096;
+    if (echo_ && c != kCtrlZ && c != kEscape) output_.push_back(c);
+    if (c == kCtrlZ) {
+        CommandSet* set = prompting_;
+        prompting_ = nullptr;
+        std::string info, errorText = "ERROR";
+        const bool ok = set->Complete(promptText_, info, errorText);
+        promptText_.clear();
+        output_ += info;
+        Result(ok ? "OK" : errorText);
+    } else if (c == kEscape) {
+        prompting_ = nullptr;
+        promptText_.clear();
+        Result("OK");
+    } else if (promptText_.size() < kMaxPromptText) {
+        promptText_.push_back(c);
     }
 }
 
@@ -85,29 +111,33 @@ void CardEngine::RunLine(const std::string& rawLine, Clock::time_point now) {
         return;
     }
     const std::string body = line.substr(2);
-    std::string info;
+    std::string info, errorText = "ERROR";
     bool deferred = false;
     bool ok = true;
     if (!body.empty() && std::toupper(static_cast<unsigned char>(body[0])) == 'D') {
-        ok = RunCommand(body, info, deferred, now);  // the dial string holds its own ';'
+        ok = RunCommand(body, info, errorText, deferred, now);  // the dial string holds its ';'
     } else {
         size_t start = 0;
-        while (ok && start <= body.size()) {
+        while (ok && !prompting_ && start <= body.size()) {
             size_t end = body.find(';', start);
             std::string part =
                 body.substr(start, end == std::string::npos ? std::string::npos : end - start);
-            if (!part.empty() || start == 0) ok = RunCommand(part, info, deferred, now);
+            if (!part.empty() || start == 0) ok = RunCommand(part, info, errorText, deferred, now);
             if (end == std::string::npos) break;
             start = end + 1;
         }
     }
     if (deferred && ok) return;  // the network answers later
     output_ += info;
-    Result(ok ? "OK" : "ERROR");
+    if (prompting_ && ok) {
+        output_ += "\r\n> ";
+        return;
+    }
+    Result(ok ? "OK" : errorText);
 }
 
-bool CardEngine::RunCommand(const std::string& command, std::string& info, bool& deferred,
-                            Clock::time_point now) {
+bool CardEngine::RunCommand(const std::string& command, std::string& info, std::string& errorText,
+                            bool& deferred, Clock::time_point now) {
     const std::string upper = Upper(command);
     auto line = [&](const std::string& text) { info += "\r\n" + text + "\r\n"; };
     if (upper.empty()) return true;
@@ -169,6 +199,19 @@ bool CardEngine::RunCommand(const std::string& command, std::string& info, bool&
         commandRunning_ = true;
         deferred = true;
         return true;
+    }
+    for (const auto& set : sets_) {
+        switch (set->Run(upper, command, info, errorText)) {
+            case Handled::No:
+                continue;
+            case Handled::Ok:
+                return true;
+            case Handled::Error:
+                return false;
+            case Handled::Prompt:
+                prompting_ = set.get();
+                return true;
+        }
     }
     return false;
 }

@@ -4,9 +4,12 @@
 
 #include <chrono>
 #include <cstddef>
+#include <memory>
 #include <set>
 #include <string>
 #include <vector>
+
+#include "cardsim/command_set.h"
 
 namespace vqm::cardsim {
 
@@ -27,6 +30,18 @@ enum class CallState { None = -1, Active = 0, Dialing = 2, Alerting = 3, Incomin
 class CardEngine {
   public:
     explicit CardEngine(EngineConfig config = {}) : config_(std::move(config)) {}
+
+    // A group of further commands (message memory, phonebooks, network services); asked in
+    // the order added, after the core commands.
+    void AddCommandSet(std::unique_ptr<CommandSet> set) {
+        set->Attach(this);
+        sets_.push_back(std::move(set));
+    }
+    const std::vector<std::unique_ptr<CommandSet>>& CommandSets() const { return sets_; }
+    // For command groups: an unsolicited code line (e.g. "+CMTI: \"SM\",3"), held back while a
+    // command runs; and a change of the card's kept memory, so that it is saved.
+    void Unsolicited(const std::string& text);
+    void MarkChanged() { ++revision_; }
 
     // Bytes from the dialer. Replies and echoes queue up for TakeOutput.
     void Feed(const char* bytes, size_t length, Clock::time_point now);
@@ -83,10 +98,10 @@ class CardEngine {
   private:
     void RunLine(const std::string& line, Clock::time_point now);
     // One basic or extended command; returns false for an error.
-    bool RunCommand(const std::string& command, std::string& info, bool& deferred,
-                    Clock::time_point now);
+    bool RunCommand(const std::string& command, std::string& info, std::string& errorText,
+                    bool& deferred, Clock::time_point now);
     void Result(const std::string& text);
-    void Unsolicited(const std::string& text);
+    void RunPromptByte(char c);
     void EndCall();
 
     EngineConfig config_;
@@ -98,6 +113,9 @@ class CardEngine {
     bool commandRunning_ = false;  // a deferred ATD is waiting for the network
     bool discardLine_ = false;     // the rest of a line that aborted a dial
     int volume_ = 5;
+    std::vector<std::unique_ptr<CommandSet>> sets_;
+    CommandSet* prompting_ = nullptr;  // the group whose "> " prompt is collecting text
+    std::string promptText_;
 
     CallState state_ = CallState::None;
     bool outgoing_ = false;

@@ -15,8 +15,29 @@ namespace vqm::cardsim {
 
 namespace fs = std::filesystem;
 
+namespace {
+
+// The rest of a line after its first word, as typed (message texts keep their blanks).
+std::string AfterFirstWord(const std::string& line) {
+    const size_t wordAt = line.find_first_not_of(" \t");
+    if (wordAt == std::string::npos) return {};
+    const size_t restAt = line.find_first_not_of(" \t", line.find_first_of(" \t", wordAt));
+    return restAt == std::string::npos ? std::string() : line.substr(restAt);
+}
+
+}  // namespace
+
 CardSim::CardSim(SimConfig config) : config_(std::move(config)), engine_(config_.engine) {
+    for (auto& set : StandardCommandSets())
+        engine_.AddCommandSet(std::move(set));
     LoadState();
+}
+
+std::string CardSim::ControlHelp() {
+    std::string help = kControlHelp;
+    for (const auto& set : StandardCommandSets())
+        help += set->ControlHelp();
+    return help;
 }
 
 CardSim::~CardSim() {
@@ -118,6 +139,7 @@ std::string CardSim::Control(const std::string& line) {
     std::istringstream words(line);
     std::string command, argument;
     words >> command >> argument;
+    if (command.empty()) return "ERROR: which command?";
     if (command == "pull") {
         inserted_ = false;
         PowerDown();
@@ -131,7 +153,13 @@ std::string CardSim::Control(const std::string& line) {
     } else {
         std::lock_guard<std::mutex> lock(mutex_);
         if (command == "status") return "OK " + Status();
-        std::string result = ControlEngine(command, argument);
+        std::string result;
+        const std::string rest = AfterFirstWord(line);
+        for (const auto& set : engine_.CommandSets()) {
+            result = set->Control(command, rest);
+            if (!result.empty()) break;
+        }
+        if (result.empty()) result = ControlEngine(command, argument);
         if (result != "OK") return result;
     }
     std::lock_guard<std::mutex> lock(mutex_);
@@ -229,14 +257,26 @@ std::string CardSim::RunScript(const std::string& script, const std::function<vo
 // The kept state is a small text file, one "name value" a line, so that a user can read it
 // and a damaged line costs only its own value.
 void CardSim::LoadState() {
-    if (config_.stateFile.empty()) return;
-    std::ifstream file(config_.stateFile);
+    std::ifstream file;
+    if (!config_.stateFile.empty()) file.open(config_.stateFile);
+    if (!file) {
+        // A card that has never run comes with the demo SIM.
+        for (const auto& set : engine_.CommandSets())
+            set->FillDemo();
+        savedRevision_ = engine_.Revision();
+        return;
+    }
     std::string line;
     while (std::getline(file, line)) {
         std::istringstream words(line);
         std::string name, value;
         words >> name >> value;
         if (value.empty()) continue;
+        const std::string rest = AfterFirstWord(line);
+        bool owned = false;
+        for (const auto& set : engine_.CommandSets())
+            if ((owned = set->Load(name, rest))) break;
+        if (owned) continue;
         const long number = std::strtol(value.c_str(), nullptr, 10);
         EngineConfig& config = engine_.ChangeConfig();
         if (name == "inserted") inserted_ = number != 0;
@@ -263,6 +303,8 @@ void CardSim::SaveState() {
         out << "busy " << number << "\n";
     for (const std::string& number : engine_.Unanswered())
         out << "unanswered " << number << "\n";
+    for (const auto& set : engine_.CommandSets())
+        set->Save(out);
     std::error_code error;
     fs::create_directories(fs::path(config_.stateFile).parent_path(), error);
     ReplaceFile(config_.stateFile, out.str());

@@ -52,6 +52,9 @@ class CardSim {
     bool Inserted() const { return inserted_; }
     std::string DevicePath() const;
 
+    // kControlHelp and the help of every command group.
+    static std::string ControlHelp();
+
     // One control command from the network side ("ring +441234", "busy 0123", "signal 7",
     // "pull", ...; kControlHelp lists them). Returns "OK", "OK <status>" or "ERROR: reason".
     std::string Control(const std::string& line);

@@ -90,7 +90,7 @@ int main(int argc, char** argv) {
         const std::string option = argv[i];
         const bool hasValue = i + 1 < argc;
         if (option == "--help" || option == "-h") {
-            std::printf("%s%s", kUsage, vqm::cardsim::kControlHelp);
+            std::printf("%s%s", kUsage, CardSim::ControlHelp().c_str());
             return 0;
         } else if (option == "ctl") {
             return SendControl(config.runtimeDir, argc, argv, i + 1);

@@ -145,3 +145,56 @@ TEST_F(EngineTest, SilenceAndGarbage) {
 
 }  // namespace
 }  // namespace vqm::cardsim
+
+namespace vqm::cardsim {
+namespace {
+
+// A command group that takes "+XW" with a prompt and "+XE" with an error of its own.
+class PromptedGroup : public CommandSet {
+  public:
+    Handled Run(const std::string& upper, const std::string&, std::string& info,
+                std::string& errorText) override {
+        if (upper == "+XW") return Handled::Prompt;
+        if (upper == "+XE") {
+            errorText = "+CMS ERROR: 321";
+            return Handled::Error;
+        }
+        if (upper == "+XI") {
+            info += "\r\n+XI: 1\r\n";
+            return Handled::Ok;
+        }
+        return Handled::No;
+    }
+    bool Complete(const std::string& text, std::string& info, std::string&) override {
+        received = text;
+        info += "\r\n+XW: 7\r\n";
+        return text != "bad";
+    }
+    std::string received;
+};
+
+TEST(CommandGroups, PromptCollectsTextUntilCtrlZAndEscapeCancels) {
+    CardEngine engine;
+    auto group = std::make_unique<PromptedGroup>();
+    PromptedGroup* seen = group.get();
+    engine.AddCommandSet(std::move(group));
+    const auto now = Clock::time_point{} + std::chrono::hours(1);
+    auto send = [&](const std::string& text) {
+        engine.Feed(text.data(), text.size(), now);
+        return engine.TakeOutput();
+    };
+    EXPECT_EQ(send("ATE0\r"), "ATE0\r\r\nOK\r\n");
+    EXPECT_EQ(send("AT+XW\r"), "\r\n> ");
+    EXPECT_EQ(send("0011"), "");  // no echo with ATE0
+    EXPECT_EQ(send("00\x1A"), "\r\n+XW: 7\r\n\r\nOK\r\n");
+    EXPECT_EQ(seen->received, "001100");
+    EXPECT_EQ(send("AT+XW\rbad\x1A"), "\r\n> \r\n+XW: 7\r\n\r\nERROR\r\n");
+    EXPECT_EQ(send("AT+XW\rabc\x1B"), "\r\n> \r\nOK\r\n");
+    EXPECT_EQ(seen->received, "bad");  // the cancelled text never reached the group
+    // Chained commands: a group's own error text ends the line; its information lines stay.
+    EXPECT_EQ(send("AT+XI;+XE;+CSQ\r"), "\r\n+XI: 1\r\n\r\n+CMS ERROR: 321\r\n");
+    EXPECT_EQ(send("AT+XQ\r"), "\r\nERROR\r\n");  // nobody's command
+}
+
+}  // namespace
+}  // namespace vqm::cardsim
