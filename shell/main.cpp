@@ -9,6 +9,7 @@
 #include "shell/dialogs.h"
 #include "shell/main_window.h"
 #include "shell/messages.h"
+#include "shell/view_factories.h"
 #include "support/local_socket.h"
 #include "support/settings_store.h"
 

@@ -27,7 +27,6 @@ namespace vqm {
 
 namespace {
 
-constexpr int kStatusFirstId = 1144, kStatusSecondId = 1145;
 constexpr int kAboutFirmwareId = 1161, kAboutProgramId = 1163;
 
 struct ViewInfo {
@@ -41,32 +40,7 @@ constexpr ViewInfo kViewTable[kViewCount] = {
     {"CONTACTS_VIEW", u"Contacts"},
 };
 
-// Until the dial pad proper is built in, the status lines are what the DialPad shows.
-class StatusView : public View {
-  public:
-    explicit StatusView(QWidget* parent) : View(parent) {
-        auto* layout = new QVBoxLayout(this);
-        layout->addStretch();
-        for (int id : {kStatusFirstId, kStatusSecondId}) {
-            auto* line = new QLabel(this);
-            line->setAlignment(Qt::AlignCenter);
-            line->setStyleSheet("color: #404040; font-size: 13px;");
-            SetControlId(line, id);
-            layout->addWidget(line);
-        }
-        layout->addStretch();
-    }
-};
-
 }  // namespace
-
-std::array<ViewFactory, kViewCount> DefaultViewFactories() {
-    std::array<ViewFactory, kViewCount> factories;
-    factories[kViewDialPad] = [](QWidget* parent, ShellContext&) { return new StatusView(parent); };
-    for (int i = 1; i < kViewCount; ++i)
-        factories[i] = [](QWidget* parent, ShellContext&) { return new View(parent); };
-    return factories;
-}
 
 MainWindow::MainWindow(ShellContext& context, std::array<ViewFactory, kViewCount> factories,
                        CardHost* card)

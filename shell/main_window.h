@@ -26,6 +26,8 @@ class Notifier;
 class SettingsStore;
 
 inline constexpr int kViewCount = 7;
+// The DialPad's two status lines (labels), which the card watch writes through ShowStatus.
+inline constexpr int kStatusFirstId = 1144, kStatusSecondId = 1145;
 inline constexpr int kViewDialPad = 0, kViewWriteSms = 1, kViewSmsFolder = 2,
                      kViewManageContacts = 3, kViewSettings = 4, kViewCallLog = 5,
                      kViewContacts = 6;
@@ -45,8 +47,6 @@ struct ShellContext {
 
 using ViewFactory = std::function<View*(QWidget* parent, ShellContext& context)>;
 
-// The views that this build has; a view still to come is an empty window of its class.
-std::array<ViewFactory, kViewCount> DefaultViewFactories();
 
 class MainWindow : public QWidget, public MessageTarget, public ShellUi {
   public:

@@ -1,5 +1,6 @@
 // The main window and its views on the offscreen platform, with a scripted card manager.
 #include "shell/main_window.h"
+#include "shell/view_factories.h"
 
 #include <gtest/gtest.h>
 
