@@ -1,0 +1,118 @@
+// Local copies of the phonebooks, so that a name can be found by number without the slow
+// serial link: the SIM group ("simphonebk1.db" SIM, "simphonebk2.db" Card Phone, records of
+// PhonebookEntry) and the Outlook group ("phonebk1.db" mobile, "phonebk2.db" home,
+// "phonebk3.db" work). Files are bare arrays of records; each group has one lock whose access
+// word lets several readers or one writer (a builder thread) in at a time.
+#pragma once
+
+#include <bit>
+#include <cstddef>
+#include <cstdint>
+#include <cstdio>
+#include <mutex>
+#include <string>
+
+#include "contacts/phonebook_entry.h"
+
+namespace vqm {
+
+class SettingsStore;
+
+inline constexpr int kOutlookNameSize = 128;
+inline constexpr int kOutlookNumberSize = 32;
+
+// "phonebk1.db": a contact's mobile number.
+struct OutlookMobileRecord {
+    char name[kOutlookNameSize];      // 8-bit, zero-terminated, zero-padded
+    char number[kOutlookNumberSize];  // 8-bit, zero-terminated, zero-padded
+};
+
+// "phonebk2.db": home, second home, home fax; "phonebk3.db": business, second business,
+// business fax. Only the first number is looked up by.
+struct OutlookNumbersRecord {
+    char name[kOutlookNameSize];
+    char numbers[3][kOutlookNumberSize];
+};
+
+inline constexpr size_t kOutlookMobileRecordSize = 160;
+inline constexpr size_t kOutlookNumbersRecordSize = 224;
+static_assert(sizeof(OutlookMobileRecord) == kOutlookMobileRecordSize);
+static_assert(offsetof(OutlookMobileRecord, number) == 128);
+static_assert(sizeof(OutlookNumbersRecord) == kOutlookNumbersRecordSize);
+static_assert(offsetof(OutlookNumbersRecord, numbers) == 128);
+
+// Access word of a cache lock.
+inline constexpr int kCacheFree = 0, kCacheReading = 1, kCacheWriting = 2;
+// Modes of CacheAcquire and CacheOpen.
+inline constexpr int kCacheRead = 1, kCacheWrite = 2;
+
+// A mutex held only for an instant, and the access word it guards.
+struct CacheLock {
+    std::mutex mutex;
+    int state = kCacheFree;
+    // How long an acquire or release waits for the mutex; tests shorten it.
+    int waitMs = 500;
+};
+
+enum class CacheGroupId { Sim, Outlook };
+
+// One group of cache files with its lock.
+struct CacheGroup {
+    CacheGroup(SettingsStore& settings, CacheGroupId id) : settings(settings), id(id) {}
+
+    SettingsStore& settings;  // for the install folder, read at every open
+    const CacheGroupId id;
+    CacheLock lock;
+};
+
+// Both groups, made once with the main window and shared by every reader and builder.
+struct PhonebookCaches {
+    explicit PhonebookCaches(SettingsStore& settings)
+        : sim(settings, CacheGroupId::Sim), outlook(settings, CacheGroupId::Outlook) {}
+
+    CacheGroup sim;
+    CacheGroup outlook;
+};
+
+// Files in the group (2 SIM, 3 Outlook), the record size of file n (1-based), and its path
+// (install folder + file name; empty for a bad file number).
+int CacheFileCount(const CacheGroup& group);
+size_t CacheRecordSize(const CacheGroup& group, int fileNumber);
+std::string CachePath(CacheGroup& group, int fileNumber);
+
+// Sets the access word free (when the main window is made).
+void CacheLockCreate(CacheLock& lock);
+// Mode 1 read: succeeds unless a writer is in, and marks reading. Mode 2 write: succeeds only
+// when free, and marks writing. 0 when the mutex was not had within the wait or the state
+// refuses. Readers share the reading mark, and the first to release clears it for all.
+int CacheAcquire(CacheLock& lock, int mode);
+// Sets the access word free, whoever held it.
+void CacheRelease(CacheLock& lock);
+// Waits until a write acquire succeeds, so no builder is inside, then frees the lock (when
+// the main window goes).
+void CacheLockDestroy(CacheLock& lock);
+
+// Acquires in mode and opens file n: "rb" for reading, "ab" for writing. Nothing for a bad
+// file number or mode, when the lock is refused, or when the file cannot be opened.
+FILE* CacheOpen(CacheGroup& group, int fileNumber, int mode);
+// Closes the stream when there is one and always releases the lock, even after a refused
+// open: callers pair every CacheOpen with one CacheClose.
+void CacheClose(CacheGroup& group, FILE* stream);
+
+// True when some file of the group exists and its length is a whole number of records; an
+// empty file counts.
+bool CachePresent(CacheGroup& group);
+
+// Looks a number up in the SIM group (SIM file first, then Card Phone). A record matches when
+// its number has the same length and NumbersMatch accepts it; its name goes to name as UTF-16
+// (NUL-terminated within nameSize units). 1 when found; 0 when not, when the group is absent
+// or busy, or the number is empty.
+int SimCacheFindName(CacheGroup& group, const char* number, char16_t* name, size_t nameSize);
+// The same over the mobile, home and work files, comparing only the first number of a home or
+// work record.
+int OutlookCacheFindName(CacheGroup& group, const char* number, char16_t* name, size_t nameSize);
+
+// The look-up the call log, alerts and message lists use: SIM group first, then Outlook.
+int FindNameByNumber(PhonebookCaches& caches, const char* number, char16_t* name, size_t nameSize);
+
+}  // namespace vqm
