@@ -1,0 +1,453 @@
+#include "messaging/sms_at.h"
+
+#include <cstdio>
+#include <cstring>
+
+#include "link/link.h"
+#include "support/gsm.h"
+#include "support/text.h"
+
+namespace vqm {
+
+namespace {
+
+constexpr char kCtrlZ = 0x1A;
+constexpr size_t kReplySize = 256;
+
+int Exchange(Link& link, const char* command, char* reply, size_t replySize) {
+    return static_cast<int>(AtCommand(link, command, reply, replySize));
+}
+
+// Cards put a blank behind the colon of a reply tag; the fields start after it.
+const char* SkipBlanks(const char* p, const char* end) {
+    while (p < end && *p == ' ')
+        ++p;
+    return p;
+}
+
+// The field position behind a 6-character reply tag, or nullptr when the tag is absent.
+const char* AfterTag(const char* tag, const char* reply, int length) {
+    const int at = FindPattern(0, tag, 6, reply, length);
+    return at < 0 ? nullptr : SkipBlanks(reply + at + 6, reply + length);
+}
+
+bool HasError(const char* reply, int length) {
+    return FindPattern(0, "ERROR", 5, reply, length) >= 0;
+}
+
+void CopyBounded(char* out, size_t outSize, const char* text) {
+    std::snprintf(out, outSize, "%s", text);
+}
+
+const char* StatusWord(int stat) {
+    switch (stat) {
+        case 0:
+            return "REC UNREAD";
+        case 1:
+            return "REC READ";
+        case 2:
+            return "STO UNSENT";
+        default:
+            return "";  // a stored sent message (3) is not named by the read
+    }
+}
+
+// Sends the command that asks for a prompt, then the body ended by Ctrl-Z; the reply to the
+// body goes into reply. 0 when either got no reply or no prompt came.
+int PromptAndBody(Link& link, const char* command, char* body, size_t bodyLength, size_t bodySize,
+                  char* reply, size_t replySize) {
+    int length = Exchange(link, command, reply, replySize);
+    if (length == 0 || FindPattern(0, ">", 1, reply, length) < 0) return 0;
+    if (bodyLength + 2 > bodySize) return 0;
+    body[bodyLength] = kCtrlZ;
+    body[bodyLength + 1] = '\0';
+    return Exchange(link, body, reply, replySize);
+}
+
+// "AT+CMGW" and "AT+CMGS" in PDU mode differ only in the command and the confirmation.
+int SendPduWithPrompt(Link& link, const char* commandFormat, SmsRecord* record, char* reply,
+                      size_t replySize, int* replyLength) {
+    char pdu[kSmsPduCommandSize];
+    const int octets = BuildSubmitPdu(*record, pdu, sizeof pdu - 1);  // room for Ctrl-Z
+    if (octets == 0) return 0;
+    char command[32];
+    std::snprintf(command, sizeof command, commandFormat, octets);
+    *replyLength =
+        PromptAndBody(link, command, pdu, std::strlen(pdu), sizeof pdu, reply, replySize);
+    return *replyLength > 0;
+}
+
+// Same for text mode: the record's text in the GSM alphabet straight into the command buffer.
+int SendTextWithPrompt(Link& link, const char* command, SmsRecord* record, char* reply,
+                       size_t replySize, int* replyLength) {
+    char body[kSmsPduCommandSize];
+    int count = record->length < 0 ? 0 : record->length;
+    if (count > static_cast<int>(sizeof record->text)) count = sizeof record->text;
+    const int written = TextToGsm(record->text, count, body, sizeof body - 2);
+    *replyLength = PromptAndBody(link, command, body, static_cast<size_t>(written), sizeof body,
+                                 reply, replySize);
+    return *replyLength > 0;
+}
+
+void AfterWrite(SmsRecord* record, const char* reply, int length) {
+    CopyBounded(record->status, sizeof record->status, "STO UNSENT");
+    record->date[0] = '\0';
+    const char* p = AfterTag("+CMGW:", reply, length);
+    int32_t index;
+    if (p && ParseInt(p, reply + length, &index)) record->index = index;
+}
+
+// "yy/MM/dd,hh:mm:ss+zz" as hh:mm:ss,dd/MM/20yy; a field of another shape stays as it came.
+void ReorderTextDate(char* date, size_t dateSize) {
+    if (std::strlen(date) < 17 || date[2] != '/' || date[5] != '/' || date[8] != ',') return;
+    char ordered[20];
+    std::snprintf(ordered, sizeof ordered, "%.8s,%.2s/%.2s/20%.2s", date + 9, date + 6, date + 3,
+                  date);
+    CopyBounded(date, dateSize, ordered);
+}
+
+}  // namespace
+
+int SmsGetCentre(Link& link, char16_t* centre, size_t centreSize, int32_t* validity) {
+    char reply[kReplySize];
+    int length = Exchange(link, "AT+CSCA?\r", reply, sizeof reply);
+    if (length == 0) return 0;
+    if (const char* p = AfterTag("+CSCA:", reply, length); p && centre && centreSize > 0) {
+        char number[64];
+        int numberLength = 0;
+        if (ParseQuoted(p, reply + length, number, sizeof number, &numberLength) &&
+            numberLength >= 1)
+            NarrowToWide(number, centre, numberLength, centreSize);
+        else
+            centre[0] = u'\0';
+    }
+    length = Exchange(link, "AT+CSMP?\r", reply, sizeof reply);
+    if (length == 0) return 0;
+    const char* p = AfterTag("+CSMP:", reply, length);
+    if (!p || !validity) return 1;
+    // <fo> and <vp> land in the one output on purpose: only <vp> is wanted.
+    const char* end = reply + length;
+    const char* after = ParseInt(p, end, validity);
+    if (!after || after >= end || *after != ',') {
+        *validity = 0;
+        return 1;
+    }
+    ParseInt(after + 1, end, validity);
+    return 1;
+}
+
+int SmsSetCentre(Link& link, const char16_t* centre, int parameter) {
+    char number[64];
+    const int count = centre ? static_cast<int>(WideLength(centre, sizeof number - 1)) : 0;
+    WideToNarrow(centre ? centre : u"", number, count, sizeof number);
+    char command[96], reply[kReplySize];
+    std::snprintf(command, sizeof command, "AT+CSCA=\"%s\"\r", number);
+    int length = Exchange(link, command, reply, sizeof reply);
+    if (length == 0 || HasError(reply, length)) return 0;
+    std::snprintf(command, sizeof command, "AT+CSMP=%d\r", parameter);
+    length = Exchange(link, command, reply, sizeof reply);
+    if (length == 0) return 0;
+    return HasError(reply, length) ? 0 : 1;
+}
+
+int SmsSelectSimStorage(Link& link, int32_t* used, int32_t* total) {
+    char reply[kReplySize];
+    const int length = Exchange(link, "AT+CPMS=\"SM\",\"SM\",\"SM\"\r", reply, sizeof reply);
+    if (length == 0) return 0;
+    const char* end = reply + length;
+    const char* p = AfterTag("+CPMS:", reply, length);
+    int32_t usedCount = 0, totalCount = 0;
+    if (!p || !(p = ParseInt(p, end, &usedCount)) || p >= end || *p != ',') return 0;
+    if (!ParseInt(p + 1, end, &totalCount)) return 0;
+    if (used) *used = usedCount;
+    if (total) *total = totalCount;
+    return 1;
+}
+
+int SmsStorageUsed(Link& link) {
+    char reply[kReplySize];
+    const int length = Exchange(link, "AT+CPMS?\r", reply, sizeof reply);
+    if (length == 0) return -1;
+    const int at = FindPattern(0, "\"SM\",", 5, reply, length);
+    if (at < 1) return -1;  // a reply that opens with the memory name is not a "+CPMS:" line
+    int32_t used;
+    return ParseInt(reply + at + 5, reply + length, &used) ? used : -1;
+}
+
+int SmsStorageFull(Link& link) {
+    int32_t used = 0, total = 0;
+    if (!SmsSelectSimStorage(link, &used, &total)) return 0;
+    return used == total ? 1 : 0;
+}
+
+int SmsParsePduReply(const char* reply, int length, SmsRecord* record) {
+    if (!reply || length <= 0 || !record) return 0;
+    const char* end = reply + length;
+    const char* p = AfterTag("+CMGR:", reply, length);
+    if (!p) return 0;
+    int32_t stat = -1;
+    p = ParseInt(p, end, &stat);
+    if (p) CopyBounded(record->status, sizeof record->status, StatusWord(stat));
+    if (!p || p >= end || *p != ',') return 0;
+    ++p;
+    if (p < end && *p == ',') ++p;  // empty alpha field
+    int32_t pduLength;
+    if (!(p = ParseInt(p, end, &pduLength))) return 0;
+    const char* pdu = p + 2;  // behind the "\r\n" that ends the header line
+    if (pdu > end) return 0;
+    // The PDU, and with it every field below, ends at the first line end.
+    const char* pduEnd = pdu;
+    while (pduEnd < end && *pduEnd != '\r' && *pduEnd != '\n')
+        ++pduEnd;
+    auto octet = [&](long position) {
+        return position < 0 || position > pduEnd - pdu ? -1 : HexToInt(pdu + position, pduEnd, 2);
+    };
+
+    const int centreLength = octet(0);
+    if (centreLength < 0) return 0;
+    const long firstOctetAt = centreLength == 0 ? 2 : (centreLength + 1) * 2L;
+    const int firstOctet = octet(firstOctetAt);
+    if (firstOctet < 0) return 0;
+    long at = firstOctetAt + 2;
+    if ((firstOctet & 0x03) != 0 || stat == 2) at += 2;  // the message reference
+
+    const int digits = octet(at);
+    const int addressType = octet(at + 2);
+    if (digits < 0 || addressType < 0) return 0;
+    const long fieldLength = (digits + 1) / 2 * 2L;
+    const long fieldAt = at + 4;
+    if (fieldAt + fieldLength > pduEnd - pdu) return 0;
+    char field[34], swapped[34];
+    const long copied = fieldLength < 32 ? fieldLength : 32;
+    std::memcpy(field, pdu + fieldAt, static_cast<size_t>(copied));
+    field[copied] = '\0';
+    PhoneToSemiOctets(field, swapped, sizeof swapped);
+    size_t swappedLength = std::strlen(swapped);
+    if (swappedLength > 0 &&
+        (swapped[swappedLength - 1] == 'F' || swapped[swappedLength - 1] == 'f'))
+        swapped[--swappedLength] = '\0';
+    // Appended, as the record comes zero-filled; never past the field's end.
+    const size_t numberUsed = strnlen(record->number, sizeof record->number);
+    if (numberUsed < sizeof record->number)
+        std::snprintf(record->number + numberUsed, sizeof record->number - numberUsed, "%s%s",
+                      addressType == 0x91 ? "+" : "", swapped);
+    at = fieldAt + fieldLength;
+
+    const int coding = octet(at + 2);  // behind the protocol identifier
+    if (coding < 0) return 0;
+    record->coding = coding;
+    if (stat == 2) {
+        at += 6;  // PID, DCS and a one-octet validity period
+    } else {
+        const long stampAt = at + 4;
+        if (stampAt + 14 > pduEnd - pdu) return 0;
+        const char* s = pdu + stampAt;
+        // Each octet has its two digits swapped: year, month, day, hour, minute, second, zone.
+        std::snprintf(record->date, sizeof record->date, "%c%c:%c%c:%c%c,%c%c/%c%c/20%c%c", s[7],
+                      s[6], s[9], s[8], s[11], s[10], s[5], s[4], s[3], s[2], s[1], s[0]);
+        at += 18;
+    }
+
+    const int userDataLength = octet(at);
+    if (userDataLength < 0) return 0;
+    const char* userData = pdu + at + 2;
+    const int userDataChars = static_cast<int>(pduEnd - userData);
+    if (coding == 8) {
+        const int count = userDataChars < static_cast<int>(sizeof record->text) - 1
+                              ? userDataChars
+                              : static_cast<int>(sizeof record->text) - 1;
+        std::memcpy(record->text, userData, static_cast<size_t>(count));
+        record->text[count] = '\0';
+        record->length = count;
+    } else if (coding == 0 || coding == 0xF2) {
+        const int count = UnpackSeptets(userData, userDataChars, record->text, sizeof record->text,
+                                        userDataLength);
+        record->length = count;
+        // The three codes that would otherwise show as blanks or odd marks.
+        for (int i = 0; i < count; ++i) {
+            char& c = record->text[i];
+            if (c == 0x00)
+                c = 0x20;
+            else if (c == 0x02)
+                c = 0x24;
+            else if (c == 0x0E)
+                c = 0x5D;
+        }
+    } else {
+        CopyBounded(record->text, sizeof record->text, "DATA MESSAGE");
+        record->length = 12;
+    }
+    return 1;
+}
+
+int SmsParseTextReply(const char* reply, int length, SmsRecord* record) {
+    if (!reply || length <= 0 || !record) return 0;
+    const char* end = reply + length;
+    const int tag = FindPattern(0, "+CMGR:", 6, reply, length);
+    if (tag < 0) return 0;
+    const char* p = reply + tag + 6;
+    if (!(p = ParseQuoted(p, end, record->status, sizeof record->status, nullptr))) return 0;
+    if (p >= end || *p != ',') return 0;
+    if (!(p = ParseQuoted(p + 1, end, record->number, sizeof record->number, nullptr))) return 0;
+    if (p >= end || *p != ',') return 0;
+    ++p;
+    if (p < end && *p == ',') {
+        if (!(p = ParseQuoted(p + 1, end, record->date, sizeof record->date, nullptr))) return 0;
+        ReorderTextDate(record->date, sizeof record->date);
+    }
+    const long bodyAt = (p - reply) + 2;
+    const int okAt = FindPattern(0, "\r\nOK\r\n", 6, reply, length);
+    if (okAt < 1) return 0;
+    long count = okAt - bodyAt;
+    if (count < 0) count = 0;
+    if (count > 639) count = 639;
+    std::memcpy(record->text, reply + bodyAt, static_cast<size_t>(count));
+    record->text[count] = '\0';
+    record->length = static_cast<int32_t>(count);
+    record->coding = 0;
+    return 1;
+}
+
+int SmsRead(Link& link, int mode, SmsRecord* record) {
+    if ((mode != kSmsModePdu && mode != kSmsModeText) || !record) return 0;
+    char command[32], reply[kSmsReadReplySize];
+    std::snprintf(command, sizeof command, "AT+CMGR=%d\r", record->index);
+    const int length = Exchange(link, command, reply, sizeof reply);
+    if (length == 0) return 0;
+    return mode == kSmsModePdu ? SmsParsePduReply(reply, length, record)
+                               : SmsParseTextReply(reply, length, record);
+}
+
+int SmsWrite(Link& link, int mode, SmsRecord* record) {
+    if ((mode != kSmsModePdu && mode != kSmsModeText) || !record) return 0;
+    char reply[kReplySize];
+    int length = 0;
+    if (mode == kSmsModePdu) {
+        if (!SendPduWithPrompt(link, "AT+CMGW=%d,2\r", record, reply, sizeof reply, &length))
+            return 0;
+    } else {
+        char command[48];
+        std::snprintf(command, sizeof command, "AT+CMGW=\"%.20s\"\r", record->number);
+        if (!SendTextWithPrompt(link, command, record, reply, sizeof reply, &length)) return 0;
+    }
+    if (FindPattern(0, "+CMGW:", 6, reply, length) < 0) return 0;
+    AfterWrite(record, reply, length);
+    return 1;
+}
+
+int SmsSend(Link& link, int mode, SmsRecord* record) {
+    if ((mode != kSmsModePdu && mode != kSmsModeText) || !record) return 0;
+    char reply[kReplySize];
+    int length = 0;
+    if (mode == kSmsModePdu) {
+        if (!SendPduWithPrompt(link, "AT+CMGS=%d\r", record, reply, sizeof reply, &length))
+            return 0;
+    } else {
+        char command[48];
+        std::snprintf(command, sizeof command, "AT+CMGS=\"%.20s\",%d\r", record->number,
+                      record->number[0] == '+' ? 145 : 129);
+        if (!SendTextWithPrompt(link, command, record, reply, sizeof reply, &length)) return 0;
+    }
+    if (FindPattern(0, "+CMGS:", 6, reply, length) < 0) return 0;
+    CopyBounded(record->status, sizeof record->status, "STO SENT");
+    return 1;
+}
+
+int SmsSendStored(Link& link, int index) {
+    char command[32], reply[kReplySize];
+    std::snprintf(command, sizeof command, "AT+CMSS=%d\r", index);
+    const int length = Exchange(link, command, reply, sizeof reply);
+    return length > 0 && FindPattern(0, "+CMSS:", 6, reply, length) >= 0 ? 1 : 0;
+}
+
+int SmsDelete(Link& link, int index) {
+    char command[32], reply[kReplySize];
+    std::snprintf(command, sizeof command, "AT+CMGD=%d\r", index);
+    const int length = Exchange(link, command, reply, sizeof reply);
+    return length == 0 ? -1 : AtFinalResult(reply, length);
+}
+
+int SmsGetFormat(Link& link) {
+    char reply[kReplySize];
+    const int length = Exchange(link, "AT+CMGF?\r", reply, sizeof reply);
+    if (length == 0) return -1;
+    const char* p = AfterTag("+CMGF:", reply, length);
+    int32_t mode;
+    return p && ParseInt(p, reply + length, &mode) ? mode : -1;
+}
+
+int SmsSetFormat(Link& link, int mode) {
+    char command[32], reply[kReplySize];
+    std::snprintf(command, sizeof command, "AT+CMGF=%d\r", mode);
+    const int length = Exchange(link, command, reply, sizeof reply);
+    return length == 0 ? -1 : AtFinalResult(reply, length);
+}
+
+int SmsSetCharset(Link& link, const char* name) {
+    char command[64], reply[kReplySize];
+    std::snprintf(command, sizeof command, "AT+CSCS=\"%s\"\r", name ? name : "");
+    const int length = Exchange(link, command, reply, sizeof reply);
+    return length == 0 ? -1 : AtFinalResult(reply, length);
+}
+
+int PhoneToSemiOctets(const char* number, char* out, size_t outSize) {
+    if (!out || outSize == 0) return 0;
+    out[0] = '\0';
+    if (!number) return 0;
+    if (*number == '+') ++number;
+    size_t count = strnlen(number, 32);
+    // Keep room for the pad and the NUL.
+    while (count > 0 && count + (count & 1) + 1 > outSize)
+        --count;
+    std::memcpy(out, number, count);
+    size_t written = count;
+    if (written & 1) out[written++] = 'F';
+    for (size_t i = 0; i + 1 < written; i += 2) {
+        const char first = out[i];
+        out[i] = out[i + 1];
+        out[i + 1] = first;
+    }
+    out[written] = '\0';
+    return static_cast<int>(count);
+}
+
+int BuildSubmitPdu(const SmsRecord& record, char* out, size_t outSize) {
+    if (!out || outSize == 0) return 0;
+    out[0] = '\0';
+    char number[sizeof record.number + 1];
+    std::memcpy(number, record.number, sizeof record.number);
+    number[sizeof record.number] = '\0';
+    char digits[40];
+    const int digitCount = PhoneToSemiOctets(number, digits, sizeof digits);
+    const bool ucs2 = record.coding == 8;
+    // The validity period is always 0xA7 (24 hours), whatever the centre settings say.
+    int used = std::snprintf(out, outSize, "001100%02X%s%s00%sA7%02X", digitCount & 0xFF,
+                             number[0] == '+' ? "91" : "81", digits, ucs2 ? "08" : "00",
+                             (ucs2 ? record.length / 2 : record.length) & 0xFF);
+    if (used < 0 || static_cast<size_t>(used) >= outSize) {
+        out[0] = '\0';
+        return 0;
+    }
+    char text[sizeof record.text + 1];
+    std::memcpy(text, record.text, sizeof record.text);
+    text[sizeof record.text] = '\0';
+    if (ucs2) {
+        const size_t count = std::strlen(text);
+        if (used + count + 1 > outSize) {
+            out[0] = '\0';
+            return 0;
+        }
+        std::memcpy(out + used, text, count + 1);
+        used += static_cast<int>(count);
+    } else if (text[0] != '\0') {
+        const int packed = PackSeptets(text, out + used, outSize - static_cast<size_t>(used));
+        if (packed == 0) {
+            out[0] = '\0';
+            return 0;
+        }
+        used += packed;
+    }
+    return used / 2 - 1;
+}
+
+}  // namespace vqm
