@@ -1,9 +1,11 @@
 #include "cardsim/command_set.h"
+#include "cardsim/phonebooks.h"
 
 namespace vqm::cardsim {
 
 std::vector<std::unique_ptr<CommandSet>> StandardCommandSets() {
     std::vector<std::unique_ptr<CommandSet>> sets;
+    sets.push_back(std::make_unique<Phonebooks>());
     return sets;
 }
 
