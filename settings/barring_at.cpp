@@ -1,0 +1,76 @@
+#include "settings/barring_at.h"
+
+#include <cstdint>
+#include <cstdio>
+
+#include "link/link.h"
+#include "settings/at_common.h"
+#include "support/numbers.h"
+#include "support/text.h"
+
+namespace vqm {
+
+using settings_detail::CommandResult;
+
+namespace {
+
+constexpr char kFacilities[kBarringFacilityCount][3] = {"AO", "OI", "OX", "AI",
+                                                        "IR", "AB", "AG", "AC"};
+constexpr int kAllBarrings = 5;
+constexpr char kClckTag[] = "+CLCK:";
+constexpr int kClckTagLength = 6;
+constexpr size_t kPasswordSize = 32;
+
+int SendLockCommand(Link& link, int facility, int mode, const char16_t* password,
+                    int serviceClass) {
+    char narrow[kPasswordSize] = "";
+    if (password) WideToNarrowBounded(password, narrow, sizeof narrow);
+    char command[80];
+    std::snprintf(command, sizeof command, "AT+CLCK=\"%s\",%d,\"%s\",%d\r", kFacilities[facility],
+                  mode, narrow, serviceClass);
+    return CommandResult(link, command);
+}
+
+}  // namespace
+
+const char* BarringFacility(int facility) {
+    return facility >= 0 && facility < kBarringFacilityCount ? kFacilities[facility] : nullptr;
+}
+
+int ParseBarringReply(const char* reply, int length, int serviceClass) {
+    if (!reply || length <= 0) return -1;
+    const int at = FindPattern(0, kClckTag, kClckTagLength, reply, length);
+    if (at < 0) return AtFinalResult(reply, length);
+    int32_t status = 0, reportedClass = 0;
+    const int fields = settings_detail::ScanStatusAndClass(reply, length, at, kClckTagLength,
+                                                           &status, &reportedClass);
+    if (fields == 0) return -1;
+    if (status == 0) return 0;
+    if (fields == 1) return 1;  // a lock that is not kept per class bars every class
+    return (reportedClass & serviceClass & 0xFF) != 0 ? 1 : 0;
+}
+
+int QueryBarring(Link& link, int serviceClass, int facility) {
+    if (serviceClass < 1 || serviceClass > 4 || !BarringFacility(facility)) return -1;
+    char command[32], reply[256];
+    std::snprintf(command, sizeof command, "AT+CLCK=\"%s\",2\r", kFacilities[facility]);
+    const int length = static_cast<int>(AtCommand(link, command, reply, sizeof reply));
+    if (length == 0) return -1;
+    return ParseBarringReply(reply, length, serviceClass);
+}
+
+int LockBarring(Link& link, int serviceClass, int facility, const char16_t* password) {
+    if (serviceClass < 1 || serviceClass > 4 || facility < 0 || facility > 4) return 0;
+    return SendLockCommand(link, facility, 1, password, serviceClass);
+}
+
+int UnlockBarring(Link& link, int serviceClass, int facility, const char16_t* password) {
+    if (serviceClass < 1 || serviceClass > 4 || facility < 5 || facility > 7) return 0;
+    return SendLockCommand(link, facility, 0, password, serviceClass);
+}
+
+int UnlockAllBarrings(Link& link, const char16_t* password) {
+    return SendLockCommand(link, kAllBarrings, 0, password, 7);
+}
+
+}  // namespace vqm

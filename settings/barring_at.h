@@ -1,0 +1,30 @@
+// Call barring through the facility lock "+CLCK", guarded by the network's 4-digit barring
+// password. Facilities by index: 0 "AO", 1 "OI", 2 "OX", 3 "AI", 4 "IR" (lockable) and
+// 5 "AB", 6 "AG", 7 "AC" (unlock only). Service class 1 voice, 2 data, 4 fax; 7 all three.
+#pragma once
+
+namespace vqm {
+
+struct Link;
+
+inline constexpr int kBarringFacilityCount = 8;
+// The two-letter facility of an index 0..7; nullptr outside.
+const char* BarringFacility(int facility);
+
+// "AT+CLCK=<fac>,2": 1 when the reported class shares a bit with serviceClass, 0 when it does
+// not or the status is 0; without "+CLCK:" the reply's final result code (so ERROR shows as 4,
+// never as "not barred"). -1 for a class outside 1..4 or a facility outside 0..7.
+int QueryBarring(Link& link, int serviceClass, int facility);
+// The query reply's scan on its own (a status of 1 without a class counts as barred).
+int ParseBarringReply(const char* reply, int length, int serviceClass);
+
+// "AT+CLCK=<fac>,1,<password>,<class>" for facilities 0..4. The final result code, -1 when no
+// reply came. A class outside 1..4 or a facility outside 0..4 sends nothing and returns 0,
+// the value of success: callers never pass such values.
+int LockBarring(Link& link, int serviceClass, int facility, const char16_t* password);
+// "AT+CLCK=<fac>,0,<password>,<class>" for facilities 5..7; the same results.
+int UnlockBarring(Link& link, int serviceClass, int facility, const char16_t* password);
+// "AT+CLCK=\"AB\",0,<password>,7". The final result code, -1 when no reply came.
+int UnlockAllBarrings(Link& link, const char16_t* password);
+
+}  // namespace vqm

@@ -1,0 +1,69 @@
+#include "settings/security_at.h"
+
+#include <cstdint>
+#include <cstdio>
+
+#include "link/link.h"
+#include "settings/at_common.h"
+#include "support/numbers.h"
+#include "support/text.h"
+
+namespace vqm {
+
+using settings_detail::CommandResult;
+
+namespace {
+
+constexpr char kFacilities[kSecurityCodeCount][3] = {"SC", "P2", "PS", "AB"};
+constexpr char kClckTag[] = "+CLCK:";
+constexpr int kClckTagLength = 6;
+constexpr size_t kCodeSize = 32;
+
+}  // namespace
+
+const char* SecurityFacility(int index) {
+    return index >= 0 && index < kSecurityCodeCount ? kFacilities[index] : nullptr;
+}
+
+int ParseLockReply(const char* reply, int length) {
+    if (!reply || length <= 0) return -1;
+    const int at = FindPattern(0, kClckTag, kClckTagLength, reply, length);
+    if (at < 0) return AtFinalResult(reply, length);
+    int32_t status = 0;
+    if (!settings_detail::ScanInt(reply + at + kClckTagLength, reply + length, &status)) return -1;
+    return status;
+}
+
+int QueryLock(Link& link, int index) {
+    const char* facility = SecurityFacility(index);
+    if (!facility) return -1;
+    char command[32], reply[256];
+    std::snprintf(command, sizeof command, "AT+CLCK=\"%s\",2\r", facility);
+    const int length = static_cast<int>(AtCommand(link, command, reply, sizeof reply));
+    if (length == 0) return -1;
+    return ParseLockReply(reply, length);
+}
+
+int SetLock(Link& link, int index, int mode, const char16_t* code) {
+    const char* facility = SecurityFacility(index);
+    if (!facility || (mode != 0 && mode != 1)) return -1;
+    char narrow[kCodeSize] = "";
+    if (code) WideToNarrowBounded(code, narrow, sizeof narrow);
+    char command[80];
+    std::snprintf(command, sizeof command, "AT+CLCK=\"%s\",%d,\"%s\",7\r", facility, mode, narrow);
+    return CommandResult(link, command);
+}
+
+int ChangeCode(Link& link, int index, const char16_t* oldCode, const char16_t* newCode) {
+    const char* facility = SecurityFacility(index);
+    if (!facility) return -1;
+    char oldNarrow[kCodeSize] = "", newNarrow[kCodeSize] = "";
+    if (oldCode) WideToNarrowBounded(oldCode, oldNarrow, sizeof oldNarrow);
+    if (newCode) WideToNarrowBounded(newCode, newNarrow, sizeof newNarrow);
+    char command[112];
+    std::snprintf(command, sizeof command, "AT+CPWD=\"%s\",\"%s\",\"%s\",7\r", facility, oldNarrow,
+                  newNarrow);
+    return CommandResult(link, command);
+}
+
+}  // namespace vqm
