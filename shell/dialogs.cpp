@@ -1,8 +1,12 @@
 #include "shell/dialogs.h"
 
 #include <QDialog>
+#include <QLabel>
 #include <QMessageBox>
+#include <optional>
 #include <vector>
+
+#include "shell/ui_log.h"
 
 namespace vqm {
 
@@ -14,9 +18,40 @@ constexpr int kIdOk = 1, kIdCancel = 2, kIdAbort = 3, kIdRetry = 4, kIdIgnore = 
 
 }  // namespace
 
+// The responder's or the scripted answer, when there is one; else nullopt and a person answers.
+std::optional<int> Dialogs::Answer(const DialogRequest& request) {
+    if (!responder_ && !autoAnswer_) return std::nullopt;
+    const int answer = responder_ ? responder_(request) : autoAnswer_;
+    Record(request, answer);
+    return answer;
+}
+
+void Dialogs::Record(const DialogRequest& request, int answer) {
+    if (!log_ || !log_->Enabled()) return;
+    std::u16string line = request.title + u": ";
+    if (request.dialog) {
+        // A dialog is recorded by what it says: the texts of its labels, in order.
+        bool first = true;
+        for (const QLabel* label : request.dialog->findChildren<QLabel*>()) {
+            if (label->text().isEmpty()) continue;
+            line += (first ? u"" : u" | ") + label->text().toStdU16String();
+            first = false;
+        }
+    } else {
+        line += request.text;
+    }
+    const std::u16string answerText = answer == kIdOk       ? u"OK"
+                                      : answer == kIdCancel ? u"Cancel"
+                                      : answer == kIdYes    ? u"Yes"
+                                      : answer == kIdNo     ? u"No"
+                                                            : u"other";
+    log_->Line(request.isDialog ? "dialog" : "box", line + u" -> " + answerText);
+}
+
 int Dialogs::MessageBox(QWidget* parent, const std::u16string& text, const std::u16string& title,
                         unsigned style) {
-    if (responder_) return responder_(DialogRequest{text, title, style, false, nullptr});
+    const DialogRequest request{text, title, style, false, nullptr};
+    if (const auto answer = Answer(request)) return *answer;
     QMessageBox box(parent);
     box.setText(QString::fromStdU16String(text));
     box.setWindowTitle(QString::fromStdU16String(title));
@@ -68,17 +103,21 @@ int Dialogs::MessageBox(QWidget* parent, const std::u16string& text, const std::
     for (const Button& b : buttons)
         box.addButton(b.button);
     if (style & 0x40000) box.setWindowFlag(Qt::WindowStaysOnTopHint);
-    const int pressed = box.exec();
+    box.exec();
+    int answer = kIdCancel;  // closed without a button
     for (const Button& b : buttons)
-        if (pressed == b.button) return b.id;
-    return kIdCancel;  // closed without a button
+        if (box.clickedButton() == box.button(b.button)) answer = b.id;
+    Record(request, answer);
+    return answer;
 }
 
 int Dialogs::Run(QDialog* dialog) {
-    if (responder_)
-        return responder_(DialogRequest{dialog->objectName().toStdU16String(),
-                                        dialog->windowTitle().toStdU16String(), 0, true, dialog});
-    return dialog->exec();
+    const DialogRequest request{dialog->objectName().toStdU16String(),
+                                dialog->windowTitle().toStdU16String(), 0, true, dialog};
+    if (const auto answer = Answer(request)) return *answer;
+    const int answer = dialog->exec();
+    Record(request, answer);
+    return answer;
 }
 
 }  // namespace vqm

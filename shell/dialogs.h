@@ -3,12 +3,15 @@
 #pragma once
 
 #include <functional>
+#include <optional>
 #include <string>
 
 class QDialog;
 class QWidget;
 
 namespace vqm {
+
+class UiLog;
 
 struct DialogRequest {
     std::u16string text;  // a box's text, or a dialog's object name
@@ -29,9 +32,19 @@ class Dialogs {
     // Runs a dialog modally and returns its result.
     int Run(QDialog* dialog);
     void SetResponder(Responder responder) { responder_ = std::move(responder); }
+    // Scripted runs: every box and dialog is answered at once with this id (1 OK, 2 Cancel)
+    // instead of waiting for a person; 0 asks the person.
+    void SetAutoAnswer(int id) { autoAnswer_ = id; }
+    // Each box and dialog, with its texts and the answer, goes to the log as well.
+    void SetLog(UiLog* log) { log_ = log; }
 
   private:
+    std::optional<int> Answer(const DialogRequest& request);
+    void Record(const DialogRequest& request, int answer);
+
     Responder responder_;
+    int autoAnswer_ = 0;
+    UiLog* log_ = nullptr;
 };
 
 }  // namespace vqm

@@ -1,6 +1,11 @@
 // vqm-dialer: the phone application. One instance per user: a second start brings the first
 // window forward and exits.
+#include <signal.h>
+#include <sys/signalfd.h>
+#include <unistd.h>
+
 #include <QApplication>
+#include <QSocketNotifier>
 #include <cstdio>
 #include <cstring>
 
@@ -9,6 +14,7 @@
 #include "shell/dialogs.h"
 #include "shell/main_window.h"
 #include "shell/messages.h"
+#include "shell/ui_log.h"
 #include "shell/view_factories.h"
 #include "support/local_socket.h"
 #include "support/settings_store.h"
@@ -16,16 +22,27 @@
 namespace {
 
 constexpr char kUsage[] =
-    "Usage: vqm-dialer [--help | --version | --list-ports]\n"
+    "Usage: vqm-dialer [--ui-log FILE] [--answer-boxes ok|cancel]\n"
+    "       vqm-dialer --help | --version | --list-ports\n"
     "The VQM Dialer: a phone on a GSM card modem.\n"
     "\n"
     "  --list-ports   list the active serial drivers (key, identity, device); the card is the\n"
     "                 first whose identity contains the PnpId setting\n"
     "  --version      the program's version\n"
+    "  --ui-log FILE  append a line to FILE for each status text, card state change, message\n"
+    "                 box and dialog the dialer shows\n"
+    "  --answer-boxes ok|cancel\n"
+    "                 for scripted runs: answer every message box and dialog at once\n"
     "\n"
     "The card manager (vqm-cardsim for the simulated card, vqm-commander for a real modem)\n"
     "must be running; the dialer asks it to power the card up. F9 switches the display off\n"
     "and on where the display supports it.\n";
+
+int ParseAnswer(const char* text) {
+    if (!std::strcmp(text, "ok")) return vqm::kIdOk;
+    if (!std::strcmp(text, "cancel")) return vqm::kIdCancel;
+    return 0;
+}
 
 int ListPorts() {
     vqm::SettingsStore settings;
@@ -36,29 +53,64 @@ int ListPorts() {
 }  // namespace
 
 int main(int argc, char** argv) {
+    std::string uiLogPath;
+    int autoAnswer = 0;
     for (int i = 1; i < argc; ++i) {
+        const bool hasValue = i + 1 < argc;
         if (!std::strcmp(argv[i], "--help") || !std::strcmp(argv[i], "-h")) {
             std::fputs(kUsage, stdout);
             return 0;
-        }
-        if (!std::strcmp(argv[i], "--version")) {
+        } else if (!std::strcmp(argv[i], "--version")) {
             std::puts("vqm-dialer 2.01");
             return 0;
+        } else if (!std::strcmp(argv[i], "--list-ports")) {
+            return ListPorts();
+        } else if (!std::strcmp(argv[i], "--ui-log") && hasValue) {
+            uiLogPath = argv[++i];
+        } else if (!std::strcmp(argv[i], "--answer-boxes") && hasValue &&
+                   (autoAnswer = ParseAnswer(argv[i + 1]))) {
+            ++i;
+        } else if (argv[i][0] == '-' && argv[i][1] == '-') {
+            std::fprintf(stderr, "vqm-dialer: bad option '%s'. See vqm-dialer --help.\n", argv[i]);
+            return 2;
         }
-        if (!std::strcmp(argv[i], "--list-ports")) return ListPorts();
+        // Anything else is left to Qt (-platform, -geometry, ...).
     }
 
     const std::string runtimeRoot = vqm::DefaultRuntimeRoot();
     const std::string instancePath = vqm::WindowSocketPath(runtimeRoot, vqm::kMainWindowClass);
     if (vqm::SendWindowMessage(instancePath, vqm::kMsgBringForward, 0, 0, 2000)) return 0;
 
+    // Stop signals are taken by the window's own thread (below), so every thread Qt starts
+    // must inherit them blocked.
+    sigset_t stopSignals;
+    sigemptyset(&stopSignals);
+    for (int signal : {SIGINT, SIGTERM, SIGHUP})
+        sigaddset(&stopSignals, signal);
+    pthread_sigmask(SIG_BLOCK, &stopSignals, nullptr);
+
     QApplication app(argc, argv);
     QApplication::setApplicationName("VQM Dialer");
     vqm::SettingsStore settings;
     vqm::Link link(settings, vqm::DefaultDriverRoots());
+    vqm::UiLog uiLog(uiLogPath);
     vqm::Dialogs dialogs;
+    dialogs.SetLog(&uiLog);
+    dialogs.SetAutoAnswer(autoAnswer);
     vqm::ShellContext context{settings, link, dialogs, runtimeRoot};
+    context.uiLog = &uiLog;
     vqm::MainWindow window(context, vqm::DefaultViewFactories());
+
+    // Ctrl-C or a stop from the session ends the dialer as "Exit" does: the call is hung up
+    // and the card is left as it was.
+    const int stopFd = signalfd(-1, &stopSignals, SFD_CLOEXEC | SFD_NONBLOCK);
+    QSocketNotifier stopNotifier(stopFd, QSocketNotifier::Read);
+    QObject::connect(&stopNotifier, &QSocketNotifier::activated, &window, [&] {
+        signalfd_siginfo info;
+        while (read(stopFd, &info, sizeof info) == sizeof info) {
+        }
+        window.Command(vqm::kCmdExit);
+    });
 
     // The first instance answers later starts, on the window's own thread.
     vqm::LineServer instance;
@@ -71,5 +123,6 @@ int main(int argc, char** argv) {
     window.show();
     const int result = QApplication::exec();
     instance.Stop();
+    close(stopFd);
     return result;
 }

@@ -21,6 +21,7 @@
 #include "shell/icons.h"
 #include "shell/messages.h"
 #include "shell/notifier.h"
+#include "shell/ui_log.h"
 #include "support/local_socket.h"
 
 namespace vqm {
@@ -197,6 +198,7 @@ long MainWindow::OnMessage(unsigned msg, long wParam, long lParam) {
             if (View* dialPad = ViewAt(kViewDialPad)) dialPad->OnMessage(msg, wParam, lParam);
             return 0;
         case kMsgBringForward:
+            Log("foreground", u"asked by a second start");
             Foreground();
             return 1;
         default:
@@ -321,6 +323,11 @@ void MainWindow::ShowStatus(const std::u16string& first, const std::u16string& s
     if (auto* line = qobject_cast<QLabel*>(FindControl(dialPad, kStatusSecondId)))
         line->setText(QString::fromStdU16String(second));
     statusShownAt_ = std::chrono::steady_clock::now();
+    Log("status", second.empty() ? first : first + u" | " + second);
+}
+
+void MainWindow::Log(std::string_view what, std::u16string_view text) {
+    if (context_.uiLog) context_.uiLog->Line(what, text);
 }
 
 void MainWindow::Foreground() {
@@ -367,11 +374,19 @@ void MainWindow::ShowDialPad() {
 }
 
 void MainWindow::SendToViews(unsigned msg, long wParam, long lParam) {
+    if (msg == kMsgCardStateChanged)
+        Log("card", app_.cardState == 2 ? u"2 connected" : u"1 not connected");
     for (const ViewRecord& record : views_.records)
         if (record.window) record.window->OnMessage(msg, wParam, lParam);
 }
 
 // Events
+
+void MainWindow::showEvent(QShowEvent* event) {
+    QWidget::showEvent(event);
+    if (!shownOnce_) Log("window", u"shown");
+    shownOnce_ = true;
+}
 
 void MainWindow::paintEvent(QPaintEvent*) {
     QPainter painter(this);

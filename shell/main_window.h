@@ -9,6 +9,7 @@
 #include <chrono>
 #include <functional>
 #include <memory>
+#include <string_view>
 
 #include "shell/card_watch.h"
 #include "shell/display_power.h"
@@ -24,6 +25,7 @@ struct Link;
 class Dialogs;
 class Notifier;
 class SettingsStore;
+class UiLog;
 
 inline constexpr int kViewCount = 7;
 // The DialPad's two status lines (labels), which the card watch writes through ShowStatus.
@@ -41,12 +43,12 @@ struct ShellContext {
     Link& link;
     Dialogs& dialogs;
     std::string runtimeRoot;
+    UiLog* uiLog = nullptr;            // what the window shows, recorded when the program asks
     MessageLayer* messages = nullptr;  // set by the main window
     class MainWindow* mainWindow = nullptr;
 };
 
 using ViewFactory = std::function<View*(QWidget* parent, ShellContext& context)>;
-
 
 class MainWindow : public QWidget, public MessageTarget, public ShellUi {
   public:
@@ -91,6 +93,7 @@ class MainWindow : public QWidget, public MessageTarget, public ShellUi {
     void keyPressEvent(QKeyEvent* event) override;
     void changeEvent(QEvent* event) override;
     void closeEvent(QCloseEvent* event) override;
+    void showEvent(QShowEvent* event) override;
 
   private:
     void BuildMenuBar();
@@ -100,6 +103,7 @@ class MainWindow : public QWidget, public MessageTarget, public ShellUi {
     void ShowTrayMenu();
     void ShowAbout();
     void Shutdown();
+    void Log(std::string_view what, std::u16string_view text);
 
     ShellContext& context_;
     MessageLayer messages_;
@@ -120,6 +124,7 @@ class MainWindow : public QWidget, public MessageTarget, public ShellUi {
     QTimer watchTimer_;
     std::chrono::steady_clock::time_point statusShownAt_{};
     bool shutDown_ = false;
+    bool shownOnce_ = false;
 };
 
 }  // namespace vqm

@@ -1,20 +1,15 @@
 // vqm-cardsim run as a user runs it: a separate process, its sockets, its control client.
-#include <signal.h>
-#include <sys/wait.h>
-#include <unistd.h>
-
 #include <gtest/gtest.h>
 
 #include <chrono>
-#include <cstdio>
 #include <filesystem>
 #include <fstream>
-#include <thread>
 
 #include "cardsim/card_sim.h"
 #include "link/link.h"
 #include "support/local_socket.h"
 #include "support/settings_store.h"
+#include "tests/common/process.h"
 #include "tests/common/temp_folder.h"
 
 namespace vqm::cardsim {
@@ -22,51 +17,17 @@ namespace {
 
 namespace fs = std::filesystem;
 using namespace std::chrono_literals;
-
-// Output and exit status of a shell command.
-std::pair<std::string, int> RunShell(const std::string& command) {
-    std::string output;
-    FILE* pipe = popen((command + " 2>&1").c_str(), "r");
-    char buffer[512];
-    while (pipe && std::fgets(buffer, sizeof buffer, pipe))
-        output += buffer;
-    int status = pipe ? pclose(pipe) : -1;
-    return {output, WIFEXITED(status) ? WEXITSTATUS(status) : -1};
-}
-
-template <typename Condition>
-bool WaitFor(Condition condition, std::chrono::milliseconds limit = 5000ms) {
-    const auto end = std::chrono::steady_clock::now() + limit;
-    while (!condition()) {
-        if (std::chrono::steady_clock::now() > end) return false;
-        std::this_thread::sleep_for(10ms);
-    }
-    return true;
-}
+using vqm::testing::RunShell;
+using vqm::testing::WaitFor;
 
 class ProgramTest : public ::testing::Test {
   protected:
-    ~ProgramTest() override { Stop(); }
-
     void Start(const std::string& extra = "") {
-        const std::string command = std::string(VQM_CARDSIM) + " --baud 0 --power-up-ms 300" +
-                                    " --runtime-dir " + run_ + " --state-dir " + (temp_ / "state") +
-                                    " " + extra;
-        pid_ = fork();
-        if (pid_ == 0) {
-            execl("/bin/sh", "sh", "-c", ("exec " + command + " >/dev/null").c_str(), nullptr);
-            _exit(127);
-        }
+        card_.Start(std::string(VQM_CARDSIM) + " --baud 0 --power-up-ms 300" + " --runtime-dir " +
+                    run_ + " --state-dir " + (temp_ / "state") + " " + extra + " >/dev/null");
         ASSERT_TRUE(WaitFor([&] { return ServerAnswers(ControlPath()); }));
     }
-    int Stop() {
-        if (pid_ <= 0) return -1;
-        kill(pid_, SIGTERM);
-        int status = 0;
-        waitpid(pid_, &status, 0);
-        pid_ = -1;
-        return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-    }
+    int Stop() { return card_.Stop(); }
     std::string ControlPath() const { return run_ + "/cardsim.ctl"; }
     std::string CompanionPath() const { return WindowSocketPath(run_, kCompanionClass); }
     std::pair<std::string, int> Ctl(const std::string& command) {
@@ -75,7 +36,7 @@ class ProgramTest : public ::testing::Test {
 
     const vqm::testing::TempFolder temp_;
     const std::string run_ = temp_ / "run";
-    pid_t pid_ = -1;
+    vqm::testing::Background card_;
 };
 
 TEST_F(ProgramTest, HelpAndBadOptions) {
