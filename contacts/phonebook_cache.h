@@ -5,6 +5,7 @@
 // word lets several readers or one writer (a builder thread) in at a time.
 #pragma once
 
+#include <atomic>
 #include <bit>
 #include <cstddef>
 #include <cstdint>
@@ -49,7 +50,9 @@ inline constexpr int kCacheRead = 1, kCacheWrite = 2;
 // A mutex held only for an instant, and the access word it guards.
 struct CacheLock {
     std::mutex mutex;
-    int state = kCacheFree;
+    // Changed under the mutex; atomic so that a release that could not have the mutex in time
+    // still frees the group rather than leave it shut until the program ends.
+    std::atomic<int> state{kCacheFree};
     // How long an acquire or release waits for the mutex; tests shorten it.
     int waitMs = 500;
 };

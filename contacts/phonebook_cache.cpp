@@ -1,0 +1,173 @@
+#include "contacts/phonebook_cache.h"
+
+#include <chrono>
+#include <cstring>
+#include <filesystem>
+#include <thread>
+
+#include "support/lock_within.h"
+#include "support/numbers.h"
+#include "support/settings_store.h"
+#include "support/text.h"
+
+namespace vqm {
+
+namespace {
+
+constexpr const char* kSimFiles[] = {"simphonebk1.db", "simphonebk2.db"};
+constexpr const char* kOutlookFiles[] = {"phonebk1.db", "phonebk2.db", "phonebk3.db"};
+
+bool ValidFile(const CacheGroup& group, int fileNumber) {
+    return fileNumber >= 1 && fileNumber <= CacheFileCount(group);
+}
+
+// Reads file n of the group record by record under the read state, calling visit with each
+// whole record until it returns true. True when visit accepted one.
+template <typename Visit>
+bool ScanFile(CacheGroup& group, int fileNumber, Visit visit) {
+    const size_t size = CacheRecordSize(group, fileNumber);
+    unsigned char record[kOutlookNumbersRecordSize];
+    FILE* stream = CacheOpen(group, fileNumber, kCacheRead);
+    bool found = false;
+    if (stream) {
+        while (!found && std::fread(record, 1, size, stream) == size)
+            found = visit(record);
+    }
+    CacheClose(group, stream);
+    return found;
+}
+
+// Length of a zero-terminated field of the file, never past its width.
+int FieldLength(const char* field, size_t width) {
+    return static_cast<int>(strnlen(field, width));
+}
+
+}  // namespace
+
+int CacheFileCount(const CacheGroup& group) {
+    return group.id == CacheGroupId::Sim ? 2 : 3;
+}
+
+size_t CacheRecordSize(const CacheGroup& group, int fileNumber) {
+    if (!ValidFile(group, fileNumber)) return 0;
+    if (group.id == CacheGroupId::Sim) return kPhonebookEntrySize;
+    return fileNumber == 1 ? kOutlookMobileRecordSize : kOutlookNumbersRecordSize;
+}
+
+std::string CachePath(CacheGroup& group, int fileNumber) {
+    if (!ValidFile(group, fileNumber)) return {};
+    const char* name =
+        group.id == CacheGroupId::Sim ? kSimFiles[fileNumber - 1] : kOutlookFiles[fileNumber - 1];
+    char16_t folder[kMaxSettingLength + 2];
+    if (!GetInstallPath(group.settings, folder, sizeof folder / sizeof folder[0])) return name;
+    return Utf16ToUtf8(folder) + name;
+}
+
+void CacheLockCreate(CacheLock& lock) {
+    lock.state = kCacheFree;
+}
+
+int CacheAcquire(CacheLock& lock, int mode) {
+    if (!LockWithin(lock.mutex, lock.waitMs)) return 0;
+    int result = 0;
+    const int state = lock.state.load();
+    if (mode == kCacheRead && state != kCacheWriting) {
+        lock.state = kCacheReading;
+        result = 1;
+    } else if (mode == kCacheWrite && state == kCacheFree) {
+        lock.state = kCacheWriting;
+        result = 1;
+    }
+    lock.mutex.unlock();
+    return result;
+}
+
+void CacheRelease(CacheLock& lock) {
+    const bool held = LockWithin(lock.mutex, lock.waitMs);
+    lock.state = kCacheFree;
+    if (held) lock.mutex.unlock();
+}
+
+void CacheLockDestroy(CacheLock& lock) {
+    // A builder still running owns the write state; wait for it to give the group up.
+    while (!CacheAcquire(lock, kCacheWrite))
+        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    CacheRelease(lock);
+}
+
+FILE* CacheOpen(CacheGroup& group, int fileNumber, int mode) {
+    if (!ValidFile(group, fileNumber) || (mode != kCacheRead && mode != kCacheWrite))
+        return nullptr;
+    if (!CacheAcquire(group.lock, mode)) return nullptr;
+    const std::string path = CachePath(group, fileNumber);
+    // By the mode granted, not the word: another reader's close may already have cleared it,
+    // and a reader must never create a file.
+    return std::fopen(path.c_str(), mode == kCacheRead ? "rb" : "ab");
+}
+
+void CacheClose(CacheGroup& group, FILE* stream) {
+    if (stream) std::fclose(stream);
+    CacheRelease(group.lock);
+}
+
+bool CachePresent(CacheGroup& group) {
+    for (int n = 1; n <= CacheFileCount(group); ++n) {
+        std::error_code error;
+        const auto size = std::filesystem::file_size(CachePath(group, n), error);
+        // The remainder is what counts, so an empty file is a cache with no entries.
+        if (!error && size % CacheRecordSize(group, n) == 0) return true;
+    }
+    return false;
+}
+
+int SimCacheFindName(CacheGroup& group, const char* number, char16_t* name, size_t nameSize) {
+    if (!number || number[0] == '\0' || !name || nameSize == 0) return 0;
+    if (!CachePresent(group)) return 0;
+    const int length = FieldLength(number, kPhonebookNumberSize);
+    for (int n = 1; n <= CacheFileCount(group); ++n) {
+        const bool found = ScanFile(group, n, [&](const unsigned char* bytes) {
+            PhonebookEntry entry;
+            std::memcpy(&entry, bytes, sizeof entry);
+            if (entry.numberLength != length || !NumbersMatch(entry.number, number, length))
+                return false;
+            // The lengths come from a file: keep them inside the fields.
+            int textLength = entry.textLength;
+            if (textLength < 0) textLength = 0;
+            if (textLength > kPhonebookTextSize) textLength = kPhonebookTextSize;
+            NarrowToWide(entry.text, name, textLength, nameSize);
+            return true;
+        });
+        if (found) return 1;
+    }
+    return 0;
+}
+
+int OutlookCacheFindName(CacheGroup& group, const char* number, char16_t* name, size_t nameSize) {
+    if (!number || number[0] == '\0' || !name || nameSize == 0) return 0;
+    if (!CachePresent(group)) return 0;
+    const int length = FieldLength(number, kOutlookNumberSize);
+    for (int n = 1; n <= CacheFileCount(group); ++n) {
+        const bool found = ScanFile(group, n, [&](const unsigned char* bytes) {
+            // The mobile record's number and the first of the three numbers share offset 128,
+            // and only that one is looked up by.
+            const char* recordName = reinterpret_cast<const char*>(bytes);
+            const char* recordNumber = recordName + kOutlookNameSize;
+            if (FieldLength(recordNumber, kOutlookNumberSize) != length ||
+                !NumbersMatch(recordNumber, number, length))
+                return false;
+            NarrowToWideZ(recordName, kOutlookNameSize, name, nameSize);
+            return true;
+        });
+        if (found) return 1;
+    }
+    return 0;
+}
+
+int FindNameByNumber(PhonebookCaches& caches, const char* number, char16_t* name, size_t nameSize) {
+    return SimCacheFindName(caches.sim, number, name, nameSize) ||
+                   OutlookCacheFindName(caches.outlook, number, name, nameSize)
+               ? 1
+               : 0;
+}
+
+}  // namespace vqm
