@@ -1,0 +1,190 @@
+#include "calls/alerts.h"
+
+#include <cstdio>
+
+#include "calls/dial_pad.h"
+#include "calls/tones.h"
+#include "calls/unsolicited.h"
+#include "contacts/phonebook_cache.h"
+#include "link/link.h"
+#include "support/local_socket.h"
+#include "support/settings_store.h"
+#include "support/text.h"
+
+namespace vqm {
+
+namespace {
+
+constexpr int kViewSmsFolder = 2, kViewCallLog = 5;
+constexpr char16_t kSimFull[] = u"SIM Full";
+constexpr char16_t kJoinedSimFull[] = u"/SIM Full";
+
+std::u16string Counted(int count, const char* format) {
+    char text[64];
+    std::snprintf(text, sizeof text, format, count);
+    return Utf8ToUtf16(text);
+}
+
+// The shell notification, unless another program asked (once) for this alert to stay quiet:
+// "CeNFMessageAlert" = 1 suppresses exactly one, and reads 0 afterwards.
+void PostShellNotification(DialPad& pad, const std::u16string& text, bool youHave) {
+    SettingsStore& settings = pad.Settings();
+    int32_t quiet = 0;
+    if (GetSettingInt(settings, u"CeNFMessageAlert", &quiet)) {
+        const int32_t zero = 0;
+        SetSettingInt(settings, u"CeNFMessageAlert", &zero);
+        if (quiet == 1) return;
+    }
+    const std::u16string body = (youHave ? u"<html><body>You have " : u"<html><body>") + text +
+                                u".<p><a href=\"cmd:2002\">Open DialPad</a></body></html>";
+    pad.Ui().PostNotification(body, AlertTonePath(settings));
+}
+
+// Sets the notification line. A full SIM stays named while other notices come and go.
+void Post(DialPad& pad, int kind, const std::u16string& text, bool youHave) {
+    Notices& notices = pad.Notifications();
+    std::u16string shown = text;
+    if (kind != kNoticeSimFull && notices.up &&
+        (notices.text.find(u'/') != std::u16string::npos || notices.lastKind == kNoticeSimFull))
+        shown = text + kJoinedSimFull;
+    pad.Ui().ShowNotificationIcon(true);
+    pad.Ui().SetControlText(kNotificationLineId, shown);
+    notices.up = true;
+    notices.lastKind = kind;
+    notices.text = shown;
+    PostShellNotification(pad, text, youHave);
+}
+
+void ClearLine(DialPad& pad) {
+    Notices& notices = pad.Notifications();
+    notices.up = false;
+    notices.text.clear();
+    pad.Ui().ShowNotificationIcon(false);
+    pad.Ui().SetControlText(kNotificationLineId, u"");
+}
+
+// A notice other than the full SIM goes; "SIM Full" stays when it was joined to it.
+void ClearNotice(DialPad& pad) {
+    Notices& notices = pad.Notifications();
+    const size_t joined = notices.text.rfind(kJoinedSimFull);
+    if (notices.up && joined != std::u16string::npos &&
+        joined + std::char_traits<char16_t>::length(kJoinedSimFull) == notices.text.size()) {
+        notices.text = kSimFull;
+        notices.lastKind = kNoticeSimFull;
+        pad.Ui().SetControlText(kNotificationLineId, notices.text);
+        return;
+    }
+    ClearLine(pad);
+}
+
+}  // namespace
+
+int CallerIdNumber(const EventRecord& record, float firmwareVersion, char* number,
+                   size_t numberSize) {
+    if (!number || numberSize == 0) return 0;
+    number[0] = '\0';
+    const int length = record.length;  // at most 255: the text field holds 256 bytes
+    if (length < 7) return 0;
+    const char* p = record.text + 6;
+    const char* end = record.text + length;
+    if (firmwareVersion <= 3.81f) {
+        while (p < end && (*p == ' ' || *p == '\t' || *p == '\r' || *p == '\n'))
+            ++p;
+        size_t n = 0;
+        while (p < end && ((*p >= '0' && *p <= '9') || *p == '+') && n + 1 < numberSize)
+            number[n++] = *p++;
+        number[n] = '\0';
+        return static_cast<int>(n);
+    }
+    int copied = 0;
+    if (!ParseQuoted(p, end, number, numberSize, &copied)) {
+        number[0] = '\0';
+        return 0;
+    }
+    return copied;
+}
+
+int OnIncomingCall(DialPad& pad, const EventRecord&) {
+    // A call being dialled or talked on keeps the pad: this dialer does not take a second one.
+    if (pad.CallState() == kCallDialing || pad.CallState() == kCallVoice) return 0;
+    DialPadUi& ui = pad.Ui();
+    pad.EnterRinging();
+    ui.BringDialPadForward();
+    ui.ShowStatus(u"Incoming call", u"");
+    ui.DisplayOnIfOff();
+    ui.StartRingTone();
+    return 0;
+}
+
+int OnCallerId(DialPad& pad, const EventRecord& record) {
+    if (record.length < 7 || pad.CallState() != kCallRinging) return 0;
+    char number[64];
+    const int length = CallerIdNumber(record, pad.LinkRef().firmwareVersion, number, sizeof number);
+    std::u16string shown = u"No number";
+    char16_t name[64] = {};
+    if (length > 0) {
+        char16_t wide[64];
+        NarrowToWide(number, wide, length, 64);
+        shown = wide;
+        FindNameByNumber(pad.Caches(), number, name, 64);
+    }
+    pad.SetStatusLine(2, name);
+    pad.SetStatusLine(3, shown);
+    pad.SetStatusLine(5, shown);
+    return 0;
+}
+
+void NotifyNewMessages(DialPad& pad, int show, int unreadCount) {
+    if (!show) {
+        if (pad.Notifications().lastKind == kNoticeNewMessages) ClearNotice(pad);
+        return;
+    }
+    pad.Ui().ShowDialPad();
+    pad.Ui().DisplayOnIfOff();
+    Post(pad, kNoticeNewMessages, Counted(unreadCount, "%d new SMS"), true);
+}
+
+void NotifyUnansweredCall(DialPad& pad) {
+    pad.Ui().ShowDialPad();
+    const int count = ++pad.Notifications().unansweredCalls;
+    Post(pad, kNoticeUnansweredCalls,
+         Counted(count, count == 1 ? "%d unanswered call" : "%d unanswered calls"), true);
+}
+
+void NotifySimFull(DialPad& pad, int full) {
+    if (full) {
+        Post(pad, kNoticeSimFull, kSimFull, false);
+        return;
+    }
+    ClearLine(pad);
+    pad.Notifications().lastKind = kNoticeNone;
+    if (pad.Ui().CompanionExists()) pad.Ui().SendCompanion(kMsgSimFullCleared);
+}
+
+void NotificationTapped(DialPad& pad) {
+    Notices& notices = pad.Notifications();
+    if (!notices.up) return;
+    const int kind = notices.lastKind;
+    ClearLine(pad);
+    notices.lastKind = kNoticeNone;
+    if (kind == kNoticeUnansweredCalls) {
+        notices.unansweredCalls = 0;
+        pad.Ui().SwitchToView(kViewCallLog);
+    } else {
+        pad.Ui().SwitchToView(kViewSmsFolder);
+    }
+}
+
+void InstallCallHandlers(UnsolicitedEvents& events, DialPad& pad,
+                         std::function<void(const std::function<void()>&)> onPadThread) {
+    events.SetHandler(kEventRing, [&pad, onPadThread](const EventRecord& record) {
+        onPadThread([&] { OnIncomingCall(pad, record); });
+        return 0;
+    });
+    events.SetHandler(kEventCallerId, [&pad, onPadThread](const EventRecord& record) {
+        onPadThread([&] { OnCallerId(pad, record); });
+        return 0;
+    });
+}
+
+}  // namespace vqm

@@ -1,0 +1,57 @@
+// What the DialPad does with a ring and a caller's number from the card, and the notification
+// line it keeps for unanswered calls, new messages and a full SIM, with the desktop
+// notification that goes with it.
+#pragma once
+
+#include <cstddef>
+#include <functional>
+#include <string>
+
+#include "calls/event_log.h"
+
+namespace vqm {
+
+class DialPad;
+class UnsolicitedEvents;
+
+inline constexpr int kNotificationIconId = 106;
+
+// The kinds of notice the line shows.
+inline constexpr int kNoticeNone = 0, kNoticeNewMessages = 1, kNoticeUnansweredCalls = 2,
+                     kNoticeSimFull = 3;
+
+struct Notices {
+    int unansweredCalls = 0;
+    bool up = false;
+    int lastKind = kNoticeNone;
+    std::u16string text;
+};
+
+// "+CRING:": the DialPad comes forward with "Incoming call", the call state becomes 4 and the
+// ring tone starts. Returns 0.
+int OnIncomingCall(DialPad& pad, const EventRecord& record);
+// "+CLIP:": the caller's number (and its name from the phonebook caches) on status lines 2 and 3
+// and in the number display. Returns 0.
+int OnCallerId(DialPad& pad, const EventRecord& record);
+
+// The caller's number of a "+CLIP:" record: unquoted up to firmware 3.81 (blanks skipped, then
+// digits and "+"), the quoted field after. Writes at most numberSize - 1 bytes and a NUL;
+// returns the length, 0 when there is none.
+int CallerIdNumber(const EventRecord& record, float firmwareVersion, char* number,
+                   size_t numberSize);
+
+// The notification line. show 0 clears the new-message notice.
+void NotifyNewMessages(DialPad& pad, int show, int unreadCount);
+void NotifyUnansweredCall(DialPad& pad);
+void NotifySimFull(DialPad& pad, int full);
+// A tap on the notice (or its desktop notification's action, 2002): the notice goes and the list
+// it speaks of opens: the Call Log for unanswered calls, the SMS Folder otherwise.
+void NotificationTapped(DialPad& pad);
+
+// Installs OnIncomingCall and OnCallerId into the events' table. Handlers may be dispatched on
+// the listener or the dial thread; onPadThread runs the work on the DialPad's own thread and
+// waits for it.
+void InstallCallHandlers(UnsolicitedEvents& events, DialPad& pad,
+                         std::function<void(const std::function<void()>&)> onPadThread);
+
+}  // namespace vqm

@@ -1,0 +1,609 @@
+#include "calls/dial_pad.h"
+
+#include <poll.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <mutex>
+#include <shared_mutex>
+
+#include "calls/call_log.h"
+#include "contacts/phonebook_cache.h"
+#include "link/link.h"
+#include "shell/messages.h"
+#include "support/local_socket.h"
+#include "support/numbers.h"
+#include "support/settings_store.h"
+#include "support/text.h"
+
+namespace vqm {
+
+namespace {
+
+constexpr int kByteWaitMs = 200;    // a one-byte read waits at most this long
+constexpr int kAnswerPollMs = 100;  // the pause between looks for the first reply byte
+constexpr float kLastUncancellableFirmware = 3.81f;
+constexpr size_t kDialNumberBytes = 32;
+
+void Pause(Link& link, int ms) {
+    if (link.sleepMs)
+        link.sleepMs(ms);
+    else
+        std::this_thread::sleep_for(std::chrono::milliseconds(ms));
+}
+
+enum class ByteRead { Byte, Silent, Failed };
+
+// The dial thread owns the port for the whole exchange and talks to the descriptor itself, a
+// byte at a time, as the link's transaction does; a hang-up or I/O error is a failed read.
+ByteRead ReadOne(int fd, char* out, int timeoutMs) {
+    pollfd p{fd, POLLIN, 0};
+    for (;;) {
+        const int ready = poll(&p, 1, timeoutMs);
+        if (ready < 0 && errno == EINTR) continue;
+        if (ready < 0) return ByteRead::Failed;
+        if (ready == 0) return ByteRead::Silent;
+        if (!(p.revents & POLLIN)) return ByteRead::Failed;
+        const ssize_t n = read(fd, out, 1);
+        if (n == 1) return ByteRead::Byte;
+        if (n < 0 && (errno == EINTR || errno == EAGAIN)) return ByteRead::Silent;
+        return ByteRead::Failed;
+    }
+}
+
+bool WriteOne(int fd, char byte) {
+    for (;;) {
+        const ssize_t n = write(fd, &byte, 1);
+        if (n == 1) return true;
+        if (n < 0 && errno == EINTR) continue;
+        if (n < 0 && errno == EAGAIN) {
+            pollfd p{fd, POLLOUT, 0};
+            if (poll(&p, 1, kByteWaitMs) > 0) continue;
+        }
+        return false;
+    }
+}
+
+std::u16string Wide(const char* narrow) {
+    char16_t wide[64];
+    NarrowToWideZ(narrow, std::strlen(narrow) + 1, wide, 64);
+    return wide;
+}
+
+// The newest entry of the Dialed log by its date-time text; the later record wins a tie.
+bool NewestDialled(CallLog& log, char (&number)[kCallLogNumberSize]) {
+    const std::vector<CallLogRecord> records = ReadCallLog(log, kCallLogDialed);
+    const CallLogRecord* newest = nullptr;
+    for (const CallLogRecord& record : records) {
+        if (!newest ||
+            CompareDateTime(1, record.time, static_cast<int>(std::strlen(record.time)),
+                            newest->time, static_cast<int>(std::strlen(newest->time))) <= 0)
+            newest = &record;
+    }
+    if (!newest || newest->number[0] == '\0') return false;
+    std::memcpy(number, newest->number, sizeof number);
+    number[kCallLogNumberSize - 1] = '\0';
+    return true;
+}
+
+}  // namespace
+
+// The number buffer
+
+int DialPadAppend(DialNumber& number, char16_t c, std::chrono::steady_clock::time_point now) {
+    if (number.count > 21) return 0;
+    if (c == u'0') {
+        const bool quick = now - number.lastZero < std::chrono::milliseconds(kDoubleZeroMs);
+        if (number.count > 1 && number.chars[number.count - 1] == u'0' && quick) {
+            number.chars[number.count - 1] = u'+';
+            return 1;
+        }
+        number.lastZero = now;
+    }
+    number.chars[number.count] = c;
+    ++number.count;
+    // The slot of a 20th character is written but never counted: at most 19 are shown.
+    if (number.count == 21) number.count = 20;
+    return 1;
+}
+
+int DialPadBackspace(DialNumber& number) {
+    if (number.count <= 1) return 0;
+    --number.count;
+    return 1;
+}
+
+std::u16string DialPadText(const DialNumber& number) {
+    if (number.count <= 1) return {};
+    const int length = number.count > 21 ? 20 : number.count - 1;
+    return std::u16string(number.chars + 1, static_cast<size_t>(length));
+}
+
+void DialPadEmpty(DialNumber& number) {
+    number.count = 1;
+}
+
+// AT operations
+
+int AnswerCall(Link& link) {
+    char reply[256];
+    const int length = static_cast<int>(AtCommand(link, "ATA\r", reply, sizeof reply));
+    return length == 0 ? -1 : AtFinalResult(reply, length);
+}
+
+int HangUp(Link& link) {
+    char reply[256];
+    return AtCommand(link, "ATH\r", reply, sizeof reply) > 0 ? 1 : 0;
+}
+
+int SendDtmf(Link& link, char c) {
+    int state = -1, mode = -1;
+    if (!QueryCallState(link, &state, &mode) || state != 0 || mode != 0) return 0;
+    char command[16], reply[256];
+    std::snprintf(command, sizeof command, "AT+VTS=%c\r", c);
+    return AtCommand(link, command, reply, sizeof reply) > 0 ? 1 : 0;
+}
+
+int DialExchange(Link& link, const char* number, std::atomic<int>& cancel) {
+    // The flag is read and cleared in one step, so a cancel is never taken twice.
+    auto takeCancel = [&cancel] { return cancel.exchange(0) == 1; };
+    if (link.portState.load() == 0 || takeCancel()) return -1;
+    char pending[257];
+    AtReadPending(link, pending, 256);
+    if (takeCancel()) return -1;
+    if (!PortLock(link)) return -1;
+    if (takeCancel()) {
+        PortUnlock(link);
+        return -1;
+    }
+
+    char command[48];
+    int commandLength = std::snprintf(command, sizeof command, "ATD%s;\r", number ? number : "");
+    if (commandLength < 0) commandLength = 0;
+    if (commandLength >= static_cast<int>(sizeof command))
+        commandLength = static_cast<int>(sizeof command) - 1;
+
+    char reply[256] = {};
+    int length = 0;
+    bool failed = false, cancelled = false;
+    {
+        std::shared_lock<std::shared_mutex> io(link.ioGuard);
+        const int fd = link.fd;
+        if (fd < 0 || link.portState.load() == 0) failed = true;
+        for (int i = 0; !failed && i < commandLength; ++i) {
+            char echo;
+            if (!WriteOne(fd, command[i]) || ReadOne(fd, &echo, kByteWaitMs) == ByteRead::Failed)
+                break;
+        }
+        if (!failed && takeCancel()) cancelled = true;
+        // Older firmware cannot take the dial back once sent: the wait runs to the card's
+        // answer (or until the port closes).
+        const bool cancellable = link.firmwareVersion > kLastUncancellableFirmware;
+        while (!failed && !cancelled) {
+            Pause(link, kAnswerPollMs);
+            if (cancellable && takeCancel()) {
+                cancelled = true;
+                break;
+            }
+            if (link.portState.load() == 0) {
+                failed = true;
+                break;
+            }
+            const ByteRead r = ReadOne(fd, &reply[0], kByteWaitMs);
+            if (r == ByteRead::Byte) {
+                length = 1;
+                break;
+            }
+            if (r == ByteRead::Failed) failed = true;
+        }
+        if (!failed && !cancelled) {
+            char byte;
+            while (ReadOne(fd, &byte, kByteWaitMs) == ByteRead::Byte)
+                if (length + 1 < static_cast<int>(sizeof reply)) reply[length++] = byte;
+            reply[length] = '\0';
+        }
+    }
+    PortUnlock(link);
+    if (failed || cancelled || takeCancel()) return -1;
+    // Codes that came with the answer wait in the queue for the listener's next pass.
+    if (link.events) link.events->UnsolicitedScan(reply, length);
+    // Only as many reply bytes as the command had are searched for the result.
+    return AtFinalResult(reply, commandLength);
+}
+
+// The DialPad
+
+DialPad::DialPad(Link& link, SettingsStore& settings, CallLog& callLog, PhonebookCaches& caches,
+                 DialPadUi& ui, SteadyNow now)
+    : link_(link),
+      settings_(settings),
+      callLog_(callLog),
+      caches_(caches),
+      ui_(ui),
+      now_(std::move(now)) {}
+
+DialPad::~DialPad() {
+    Destroy();
+}
+
+long DialPad::OnMessage(unsigned msg, long wParam, long lParam) {
+    (void)lParam;
+    if (destroyed_) return 0;
+    switch (msg) {
+        case kWmCommand:
+            OnCommand(static_cast<int>(wParam & 0xFFFF));
+            return 0;
+        case kWmHScroll:
+            OnSlider(static_cast<int>(wParam & 0xFFFF));
+            return 0;
+        case kWmTimer:
+            OnTimer(static_cast<int>(wParam));
+            return 0;
+        case kMsgCardStateChanged:
+            OnCardState(static_cast<int>(wParam));
+            return 0;
+        case kMsgDialResult:
+            OnDialResult(static_cast<int>(wParam));
+            return 0;
+        case kMsgCallActive:
+            OnCallActive();
+            return 0;
+        case kMsgCallListEmpty:
+            OnCallListEmpty();
+            return 0;
+        case kWmLButtonDown:
+        case kWmLButtonUp:
+            if (wParam == kPowerKeyId) OnPowerKey(msg == kWmLButtonDown);
+            return 0;
+        default:
+            return 0;
+    }
+}
+
+void DialPad::Destroy() {
+    if (destroyed_) return;
+    if (ui_.ControlEnabled(kVolumeSliderId)) {
+        const int32_t level = volumeLevel_;
+        SetSettingInt(settings_, u"VolumeLevel", &level);
+    }
+    if (callState_ != kCallIdle) OnEndKey();
+    ui_.StopTimer(kTimerDialPad);
+    ui_.StopTimer(kTimerPowerKey);
+    if (dialThread_.joinable()) {
+        DialCancel();
+        ui_.WaitWhileDelivering([this] { return dialThreadDone_.load(); });
+    }
+    destroyed_ = true;
+    JoinDialThread();
+}
+
+void DialPad::JoinDialThread() {
+    if (dialThread_.joinable() && dialThreadDone_.load()) dialThread_.join();
+}
+
+void DialPad::SetStatusLine(int n, const std::u16string& text) {
+    switch (n) {
+        case 1:
+            ui_.SetControlText(kStatusLine1Id, text);
+            break;
+        case 2:
+            ui_.SetControlText(kStatusLine2Id, text);
+            break;
+        case 3:
+            ui_.SetControlText(kStatusLine3Id, text);
+            break;
+        case 5:
+            ui_.SetControlText(kNumberDisplayId, text);
+            break;
+        default:
+            break;
+    }
+}
+
+void DialPad::RefreshNumberDisplay() {
+    SetStatusLine(5, DialPadText(number_));
+}
+
+void DialPad::LeaveIdle() {
+    if (callState_ != kCallIdle) return;
+    idleLines_[0] = ui_.ControlText(kStatusLine1Id);
+    idleLines_[1] = ui_.ControlText(kStatusLine2Id);
+}
+
+void DialPad::EnterRinging() {
+    LeaveIdle();
+    callState_ = kCallRinging;
+}
+
+void DialPad::EndWith(const std::u16string& text) {
+    SetStatusLine(1, text);
+    callState_ = kCallEnded;
+    endedAt_ = now_();
+}
+
+std::u16string DialPad::CallerNumber() {
+    return ui_.ControlText(kNumberDisplayId);
+}
+
+int DialPad::Dial(const std::u16string& number) {
+    // One call at a time: a dial under way or a call in progress keeps the line.
+    if (destroyed_ || (callState_ != kCallIdle && callState_ != kCallEnded)) return 0;
+    JoinDialThread();
+    if (dialThread_.joinable()) return 0;
+    char narrow[kDialNumberBytes];
+    WideToNarrow(number.data(), narrow, static_cast<int>(number.size()), sizeof narrow);
+    char16_t name[64] = {};
+    FindNameByNumber(caches_, narrow, name, 64);
+
+    LeaveIdle();
+    SetStatusLine(1, u"Dialing...");
+    SetStatusLine(2, u"");
+    SetStatusLine(3, name);
+    SetStatusLine(5, number);
+    callState_ = kCallDialing;
+    if (!DialStart(narrow)) {
+        EndWith(u"Call could not be established");
+        return 0;
+    }
+    ui_.EnableControl(kKeyCallId, false);
+    AddDialedCall(callLog_, narrow);
+    return 1;
+}
+
+int DialPad::DialStart(const char* number) {
+    JoinDialThread();
+    if (dialThread_.joinable()) return 0;
+    char request[kDialNumberBytes] = {};
+    std::snprintf(request, sizeof request, "%s", number ? number : "");
+    cancel_.store(0);
+    dialThreadDone_.store(false);
+    dialThread_ = std::thread([this, request]() mutable {
+        const int result = DialExchange(link_, request, cancel_);
+        ui_.SendToDialPad(kMsgDialResult, result, 0);
+        dialThreadDone_.store(true);
+    });
+    return 1;
+}
+
+void DialPad::OnCommand(int id) {
+    if (id >= kKeyZeroId && id <= kKeyZeroId + 9) return OnKey(static_cast<char16_t>(id - 1078));
+    switch (id) {
+        case kKeyStarId:
+            return OnKey(u'*');
+        case kKeyHashId:
+            return OnKey(u'#');
+        case kKeyCallId:
+            return OnCallKey();
+        case kKeyEndId:
+            return OnEndKey();
+        case kKeyClearId:
+            if (callState_ == kCallIdle && DialPadBackspace(number_)) RefreshNumberDisplay();
+            return;
+        case kKeyContactsId:
+            return ui_.SwitchToView(3);
+        case kCmdNotificationTapped:
+            return NotificationTapped(*this);
+        default:
+            return;
+    }
+}
+
+void DialPad::OnKey(char16_t c) {
+    if (numberDialled_) {
+        DialPadEmpty(number_);
+        numberDialled_ = false;
+    }
+    if (callState_ == kCallIdle) {
+        DialPadAppend(number_, c, now_());
+        RefreshNumberDisplay();
+    } else if (callState_ == kCallVoice) {
+        SendDtmf(link_, static_cast<char>(c));
+    }
+}
+
+void DialPad::OnCallKey() {
+    numberDialled_ = true;
+    if (callState_ == kCallIdle) {
+        if (number_.count <= 1) {
+            char last[kCallLogNumberSize];
+            if (NewestDialled(callLog_, last)) Dial(Wide(last));
+        } else {
+            Dial(DialPadText(number_));
+        }
+    } else if (callState_ == kCallRinging) {
+        if (AnswerCall(link_) == 0) {
+            char narrow[kCallLogNumberSize];
+            const std::u16string caller = CallerNumber();
+            WideToNarrow(caller.data(), narrow, static_cast<int>(caller.size()), sizeof narrow);
+            AddAnsweredCall(callLog_, narrow);
+            ui_.StopRingTone();
+            SetStatusLine(1, u"Voice call");
+            callState_ = kCallVoice;
+        } else {
+            // The ring stops with the failed answer: a tone under "Call ended" would mislead.
+            ui_.StopRingTone();
+            EndWith(u"Call ended");
+        }
+    }
+}
+
+void DialPad::OnEndKey() {
+    DialPadEmpty(number_);
+    switch (callState_) {
+        case kCallDialing:
+            DialCancel();
+            break;
+        case kCallVoice:
+            HangUp(link_);
+            EndWith(u"Call ended");
+            break;
+        case kCallRinging: {
+            HangUp(link_);
+            EndWith(u"Unanswered");
+            ui_.StopRingTone();
+            char narrow[kCallLogNumberSize];
+            const std::u16string caller = CallerNumber();
+            WideToNarrow(caller.data(), narrow, static_cast<int>(caller.size()), sizeof narrow);
+            AddUnansweredCall(callLog_, narrow);
+            break;
+        }
+        case kCallIdle:
+            if (!numberDialled_) RefreshNumberDisplay();
+            break;
+        default:
+            break;
+    }
+}
+
+void DialPad::OnDialResult(int result) {
+    switch (result) {
+        case 0:
+            SetStatusLine(1, u"Voice call");
+            callState_ = kCallVoice;
+            break;
+        case 7:
+            EndWith(u"Number is busy");
+            break;
+        case 8:
+            EndWith(u"Number not answer");
+            break;
+        default:
+            EndWith(u"Call could not be established");
+            HangUp(link_);
+            break;
+    }
+    ui_.EnableControl(kKeyCallId, true);
+}
+
+void DialPad::OnCallActive() {
+    if (callState_ != kCallRinging) return;
+    // Answered on the card's own controls.
+    char narrow[kCallLogNumberSize];
+    const std::u16string caller = CallerNumber();
+    WideToNarrow(caller.data(), narrow, static_cast<int>(caller.size()), sizeof narrow);
+    AddAnsweredCall(callLog_, narrow);
+    ui_.StopRingTone();
+    SetStatusLine(1, u"Voice call");
+    callState_ = kCallVoice;
+}
+
+void DialPad::OnCallListEmpty() {
+    if (callState_ == kCallVoice) {
+        OnEndKey();
+    } else if (callState_ == kCallRinging) {
+        NotifyUnansweredCall(*this);
+        OnEndKey();
+    }
+}
+
+void DialPad::OnTimer(int id) {
+    if (id == kTimerPowerKey) return PowerKeyHeld();
+    if (id != kTimerDialPad) return;
+    auto refreshGauge = [this] {
+        const int bars = GetSignalBars(link_);
+        if (bars >= 0) {
+            signalBars_ = bars;
+            ui_.SetSignalBars(bars);
+        }
+    };
+    if (++ticks_ % kSignalRefreshTicks == 0) refreshGauge();
+    // The dial thread holds the port for the whole dial: a read now would only stall the pad.
+    if (operatorName_.empty() && callState_ != kCallDialing) {
+        char16_t name[33] = {};
+        if (GetOperatorName(link_, name, 33) && name[0]) {
+            operatorName_ = name;
+            // Away from idle the name waits among the idle lines for the pad's return.
+            if (callState_ == kCallIdle)
+                SetStatusLine(1, operatorName_);
+            else
+                idleLines_[0] = operatorName_;
+        }
+        refreshGauge();
+    }
+    if (callState_ == kCallEnded && now_() - endedAt_ >= std::chrono::milliseconds(kResultShowMs)) {
+        SetStatusLine(1, idleLines_[0]);
+        SetStatusLine(2, idleLines_[1]);
+        SetStatusLine(3, u"");
+        callState_ = kCallIdle;
+    }
+}
+
+void DialPad::SetAllKeys(bool enable) {
+    for (int id = kKeyZeroId; id <= kKeyContactsId; ++id)
+        ui_.EnableControl(id, enable);
+}
+
+void DialPad::OnCardState(int state) {
+    if (state == 1) {
+        ui_.StopTimer(kTimerDialPad);
+        SetAllKeys(false);
+        ui_.EnableControl(kVolumeSliderId, false);
+        SetStatusLine(1, u"");
+        ui_.SetSliderPosition(0);
+        signalBars_ = 0;
+        ui_.SetSignalBars(0);
+        ui_.SetControlText(kNotificationLineId, u"");
+        ui_.ShowNotificationIcon(false);
+        notices_.up = false;
+        notices_.text.clear();
+        // With the card gone no call can go on: the ring stops and the pad is idle again.
+        if (callState_ == kCallRinging) ui_.StopRingTone();
+        if (callState_ != kCallDialing) callState_ = kCallIdle;
+        return;
+    }
+    if (state != 2) return;
+    SetAllKeys(true);
+    ui_.EnableControl(kVolumeSliderId, true);
+    SetStatusLine(1, u"Searching network...");
+    operatorName_.clear();
+    SetStatusLine(2, u"");
+    SetStatusLine(3, u"");
+    idleLines_[0] = u"Searching network...";
+    idleLines_[1].clear();
+    int32_t level = kDefaultVolumeLevel;
+    if (!GetSettingInt(settings_, u"VolumeLevel", &level)) {
+        level = kDefaultVolumeLevel;
+        SetSettingInt(settings_, u"VolumeLevel", &level);
+    }
+    if (level < 0) level = 0;
+    if (level > kMaxVolumeLevel) level = kMaxVolumeLevel;
+    if (SetSpeakerVolume(link_, level) != 0)
+        ui_.EnableControl(kVolumeSliderId, false);
+    else
+        volumeLevel_ = level;
+    ui_.SetSliderPosition(volumeLevel_);
+    const int32_t poweredUp = 0;
+    SetSettingInt(settings_, u"DialPadPowerDown", &poweredUp);
+    ticks_ = 0;
+    ui_.StartTimer(kTimerDialPad, 1000);
+}
+
+void DialPad::OnSlider(int code) {
+    if (!(code < 4 || code == kTbEndTrack)) return;
+    const int position = ui_.SliderPosition();
+    if (SetSpeakerVolume(link_, position) == 0)
+        volumeLevel_ = position;
+    else
+        ui_.SetSliderPosition(volumeLevel_);  // the card kept its level; so does the slider
+}
+
+void DialPad::OnPowerKey(bool down) {
+    if (down)
+        ui_.StartTimer(kTimerPowerKey, 1000);
+    else
+        ui_.StopTimer(kTimerPowerKey);
+}
+
+void DialPad::PowerKeyHeld() {
+    // One power change per press, however long the button stays down.
+    ui_.StopTimer(kTimerPowerKey);
+    if (!ui_.CompanionExists()) return;
+    const int32_t poweredDown = 1;
+    SetSettingInt(settings_, u"DialPadPowerDown", &poweredDown);
+    const std::optional<long> power = ui_.SendCompanion(kMsgCardPowerQuery);
+    ui_.SendCompanion(power && *power != 0 ? kMsgCardPowerDown : kMsgCardPowerUp);
+}
+
+}  // namespace vqm
