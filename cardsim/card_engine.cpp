@@ -150,7 +150,7 @@ bool CardEngine::RunCommand(const std::string& command, std::string& info, std::
         return true;
     }
     if (upper.size() == 2 && upper[0] == 'X' && upper[1] >= '0' && upper[1] <= '5') return true;
-    for (const char* setting : {"+CSCS=", "+CBST=", "+CLIP=", "+CRC=", "+CNMI=", "+CMEE="})
+    for (const char* setting : {"+CSCS=", "+CLIP=", "+CRC=", "+CNMI=", "+CMEE="})
         if (StartsWith(upper, setting)) return upper.size() > std::string(setting).size();
     if (upper == "+GMI" || upper == "+CGMI") return line("Tavro Mobile Phones"), true;
     if (upper == "+GMM" || upper == "+CGMM") return line("TAVRO CARD PHONE 2.0"), true;

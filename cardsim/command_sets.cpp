@@ -1,10 +1,12 @@
 #include "cardsim/command_set.h"
+#include "cardsim/network_services.h"
 #include "cardsim/phonebooks.h"
 
 namespace vqm::cardsim {
 
 std::vector<std::unique_ptr<CommandSet>> StandardCommandSets() {
     std::vector<std::unique_ptr<CommandSet>> sets;
+    sets.push_back(std::make_unique<NetworkServices>());
     sets.push_back(std::make_unique<Phonebooks>());
     return sets;
 }

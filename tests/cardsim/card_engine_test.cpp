@@ -1,4 +1,5 @@
 #include "cardsim/card_engine.h"
+#include "cardsim/network_services.h"
 
 #include <gtest/gtest.h>
 
@@ -32,6 +33,7 @@ class EngineTest : public ::testing::Test {
 };
 
 TEST_F(EngineTest, EchoAndTheInitialisationTable) {
+    engine_.AddCommandSet(std::make_unique<NetworkServices>());  // it owns "+CBST="
     EXPECT_EQ(Send("AT&F\r"), "AT&F\r\r\nOK\r\n");
     EXPECT_EQ(Send("ATE0\r"), "ATE0\r\r\nOK\r\n");  // echoed before it takes effect
     EXPECT_EQ(Send("ATE1\r"), "\r\nOK\r\n");
