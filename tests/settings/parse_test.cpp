@@ -1,0 +1,182 @@
+// The reply scans of the settings wrappers on hand-written replies: the layouts the card sends,
+// short and truncated lists, garbage, and replies cut by the length they are given.
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "settings/barring_at.h"
+#include "settings/forwarding_at.h"
+#include "settings/network_at.h"
+#include "settings/security_at.h"
+
+namespace vqm {
+namespace {
+
+struct Search {
+    int result = 0;
+    int count = -7;
+    std::vector<std::u16string> names;
+};
+
+Search ScanSearch(const std::string& reply, int maxNames = 8, int length = -1) {
+    std::vector<OperatorName> names(static_cast<size_t>(maxNames) + 1);
+    for (auto& name : names)
+        std::memcpy(name, u"untouched", sizeof u"untouched");
+    Search out;
+    out.result =
+        ParseOperatorSearch(reply.data(), length < 0 ? static_cast<int>(reply.size()) : length,
+                            names.data(), maxNames, &out.count);
+    for (int i = 0; i < maxNames + 1; ++i)
+        out.names.push_back(names[i]);
+    return out;
+}
+
+TEST(OperatorSearchScan, ReadsEntriesOfTheCardsLayoutInReplyOrder) {
+    Search s = ScanSearch("\r\n+COPS: 2,,,20201,3,,,20205,\r\n\r\nOK\r\n");
+    EXPECT_EQ(s.result, 1);
+    ASSERT_EQ(s.count, 2);
+    EXPECT_EQ(s.names[0], u"COSMOTE");
+    EXPECT_EQ(s.names[1], u"PANAFON");  // forbidden, listed all the same
+    EXPECT_EQ(s.names[2], u"untouched");
+
+    // An empty list and a list in the bracketed layout both find nothing but still succeed.
+    s = ScanSearch("\r\n+COPS: \r\n\r\nOK\r\n");
+    EXPECT_EQ(s.result, 1);
+    EXPECT_EQ(s.count, 0);
+    s = ScanSearch(
+        "+COPS: (2,\"COSMOTE\",\"COSMOTE\",\"20201\"),(1,\"P\",\"P\",\"20205\")\r\nOK\r\n");
+    EXPECT_EQ(s.result, 1);
+    EXPECT_EQ(s.count, 0);
+}
+
+TEST(OperatorSearchScan, MovesByTenCharactersWhateverTheEntryLength) {
+    // The six-digit code shifts everything after it: the third entry is out of step and
+    // ends the scan; the second, unknown, repeats the name before it.
+    Search s = ScanSearch("+COPS: 2,,,20201,1,,,202050,1,,,20210,\r\nOK\r\n");
+    ASSERT_EQ(s.count, 2);
+    EXPECT_EQ(s.names[0], u"COSMOTE");
+    EXPECT_EQ(s.names[1], u"COSMOTE");
+    // The first entry is expected after the blank that follows the tag; without the blank
+    // the scan starts on a comma and finds nothing.
+    s = ScanSearch("+COPS:2,,,20201,1,,,20205,");
+    EXPECT_EQ(s.result, 1);
+    EXPECT_EQ(s.count, 0);
+}
+
+TEST(OperatorSearchScan, UnknownCodesTakeThePreviousNameOrTheirDigitsWhenFirst) {
+    Search s = ScanSearch("+COPS: 1,,,99999,1,,,20205,1,,,99998,1,,,21402,");
+    ASSERT_EQ(s.count, 4);
+    EXPECT_EQ(s.names[0], u"99999");
+    EXPECT_EQ(s.names[1], u"PANAFON");
+    EXPECT_EQ(s.names[2], u"PANAFON");
+    EXPECT_EQ(s.names[3], u"MOVISTAR");
+}
+
+TEST(OperatorSearchScan, StaysInsideTheReplyAndTheList) {
+    EXPECT_EQ(ScanSearch("\r\nERROR\r\n").result, -1);
+    EXPECT_EQ(ScanSearch("\r\nERROR\r\n").count, -7);  // the count is left alone
+    EXPECT_EQ(ScanSearch("").result, -1);
+    EXPECT_EQ(ScanSearch("+COPS").result, -1);
+
+    // Truncated in the middle of an entry: what is complete counts.
+    EXPECT_EQ(ScanSearch("+COPS: 2,,,20201,1,,").count, 1);
+    EXPECT_EQ(ScanSearch("+COPS: 2,,,20201,1,,,").count, 1);
+    EXPECT_EQ(ScanSearch("+COPS: 2,,,20201,x,,,20205,").count, 1);
+
+    // The given length ends the reply even where the buffer goes on.
+    const std::string reply = "+COPS: 2,,,20201,1,,,20205,1,,,20210,";
+    EXPECT_EQ(ScanSearch(reply, 8, 17).count, 1);
+    EXPECT_EQ(ScanSearch(reply, 8, 21).count, 1);  // cut before the second code
+    Search cut = ScanSearch(reply, 8, 25);         // the second code cut to 2020
+    ASSERT_EQ(cut.count, 2);
+    EXPECT_EQ(cut.names[1], u"COSMOTE");
+    cut = ScanSearch(reply, 8, 26);  // the comma after a code is not needed
+    ASSERT_EQ(cut.count, 2);
+    EXPECT_EQ(cut.names[1], u"PANAFON");
+
+    // No more names than the list holds.
+    Search s = ScanSearch(reply, 2);
+    EXPECT_EQ(s.count, 2);
+    EXPECT_EQ(s.names[2], u"untouched");
+}
+
+TEST(NetworkModeScan, ReadsTheSelectionMode) {
+    const std::string manual = "\r\n+COPS: 1,2,20201\r\n\r\nOK\r\n";
+    EXPECT_EQ(ParseNetworkMode(manual.data(), static_cast<int>(manual.size())), 1);
+    const std::string automatic = "\r\n+COPS: 0,2,20201\r\n\r\nOK\r\n";
+    EXPECT_EQ(ParseNetworkMode(automatic.data(), static_cast<int>(automatic.size())), 0);
+    EXPECT_EQ(ParseNetworkMode("\r\nOK\r\n", 6), -1);
+    EXPECT_EQ(ParseNetworkMode("+COPS: ,,", 9), -1);
+    EXPECT_EQ(ParseNetworkMode("+COPS: 1", 6), -1);  // cut before the number
+}
+
+int Forward(const std::string& reply, std::u16string* number = nullptr, size_t size = 32) {
+    std::vector<char16_t> out(size + 1, u'#');
+    const int result =
+        ParseForwardReply(reply.data(), static_cast<int>(reply.size()), out.data(), size);
+    EXPECT_EQ(out[size], u'#');  // nothing past the given size
+    if (number) *number = out.data();
+    return result;
+}
+
+TEST(ForwardScan, StatusAndNumber) {
+    std::u16string number;
+    EXPECT_EQ(Forward("\r\n+CCFC: 1,1,\"+447700900123\",145\r\n\r\nOK\r\n", &number), 1);
+    EXPECT_EQ(number, u"+447700900123");
+    EXPECT_EQ(Forward("\r\n+CCFC: 1,1,\"0123\",129,,,20\r\n\r\nOK\r\n", &number), 1);
+    EXPECT_EQ(number, u"0123");
+    EXPECT_EQ(Forward("\r\n+CCFC: 0,7\r\n\r\nOK\r\n"), 0);
+    EXPECT_EQ(Forward("\r\n+CCFC: 2,1\r\n\r\nOK\r\n"), 0);  // anything but 1 is not active
+    // The first line decides, even when a later one is active.
+    EXPECT_EQ(Forward("+CCFC: 0,1\r\n+CCFC: 1,4,\"99\",129\r\n"), 0);
+
+    EXPECT_EQ(Forward("+CCFC: 1,1\r\nOK\r\n", &number), 1);  // active, no number given
+    EXPECT_EQ(number, u"");
+    EXPECT_EQ(Forward("+CCFC: 1,1,\"0123456789", &number), 1);  // unterminated quote
+    EXPECT_EQ(number, u"");
+    EXPECT_EQ(Forward("+CCFC: 1,1,\"0123456789\",129", &number, 5), 1);
+    EXPECT_EQ(number, u"0123");
+
+    EXPECT_EQ(Forward("\r\nERROR\r\n"), -1);
+    EXPECT_EQ(Forward("\r\n+CCFC: \r\nOK\r\n"), -1);
+    EXPECT_EQ(Forward("+CCFC:"), -1);
+}
+
+int Barring(const std::string& reply, int serviceClass) {
+    return ParseBarringReply(reply.data(), static_cast<int>(reply.size()), serviceClass);
+}
+
+TEST(BarringScan, ReportedClassesAgainstTheAskedOne) {
+    for (int serviceClass : {1, 2, 4})
+        EXPECT_EQ(Barring("\r\n+CLCK: 1,7\r\n\r\nOK\r\n", serviceClass), 1) << serviceClass;
+    EXPECT_EQ(Barring("\r\n+CLCK: 1,5\r\n\r\nOK\r\n", 2), 0);
+    EXPECT_EQ(Barring("\r\n+CLCK: 1,5\r\n\r\nOK\r\n", 4), 1);
+    EXPECT_EQ(Barring("\r\n+CLCK: 0,7\r\n\r\nOK\r\n", 1), 0);
+    EXPECT_EQ(Barring("\r\n+CLCK: 1\r\n\r\nOK\r\n", 2), 1);
+
+    // Without the tag the final result stands in for the state: ERROR is not "not barred".
+    EXPECT_EQ(Barring("\r\nERROR\r\n", 1), 4);
+    // "+CME ERROR: n" is no final result the link knows: -1, a failure like ERROR.
+    EXPECT_EQ(Barring("\r\n+CME ERROR: 16\r\n", 1), -1);
+    EXPECT_EQ(Barring("\r\nOK\r\n", 1), 0);
+    EXPECT_EQ(Barring("\r\ngarbage", 1), -1);
+    EXPECT_EQ(Barring("\r\n+CLCK: ?\r\nOK\r\n", 1), -1);
+}
+
+TEST(LockScan, StatusOrFinalResult) {
+    auto lock = [](const std::string& reply) {
+        return ParseLockReply(reply.data(), static_cast<int>(reply.size()));
+    };
+    EXPECT_EQ(lock("\r\n+CLCK: 1\r\n\r\nOK\r\n"), 1);
+    EXPECT_EQ(lock("\r\n+CLCK: 0\r\n\r\nOK\r\n"), 0);
+    EXPECT_EQ(lock("\r\n+CLCK: 1,7\r\n\r\nOK\r\n"), 1);
+    EXPECT_EQ(lock("\r\nERROR\r\n"), 4);
+    EXPECT_EQ(lock("\r\n+CME ERROR: 10\r\n"), -1);
+    EXPECT_EQ(lock("\r\n+CLCK:"), -1);
+    EXPECT_EQ(lock(""), -1);
+}
+
+}  // namespace
+}  // namespace vqm
