@@ -3,6 +3,8 @@
 #include <QLabel>
 #include <QVBoxLayout>
 
+#include "calls/call_log_view.h"
+
 namespace vqm {
 
 namespace {
@@ -31,6 +33,7 @@ std::array<ViewFactory, kViewCount> DefaultViewFactories() {
     factories[kViewDialPad] = [](QWidget* parent, ShellContext&) { return new StatusView(parent); };
     for (int i = 1; i < kViewCount; ++i)
         factories[i] = [](QWidget* parent, ShellContext&) { return new View(parent); };
+    factories[kViewCallLog] = CreateCallLogView;
     return factories;
 }
 
