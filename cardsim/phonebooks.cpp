@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "cardsim/card_engine.h"
+#include "support/gsm.h"
 #include "support/text.h"
 
 namespace vqm::cardsim {
@@ -75,9 +76,9 @@ std::string LatinToUtf8(const std::string& text) {
     return Utf16ToUtf8(wide);
 }
 
-std::string EntryLine(int index, const Phonebooks::Entry& entry) {
-    return "\r\n+CPBR: " + std::to_string(index) + ",\"" + entry.number + "\"," +
-           std::to_string(entry.type) + ",\"" + entry.text + "\"\r\n";
+std::string EntryLine(int index, const std::string& number, int type, const std::string& text) {
+    return "\r\n+CPBR: " + std::to_string(index) + ",\"" + number + "\"," + std::to_string(type) +
+           ",\"" + text + "\"\r\n";
 }
 
 // Demo contacts: numbers from the ranges set aside for drama, so no real subscriber is rung.
@@ -114,6 +115,61 @@ const Phonebooks::Book* Phonebooks::Find(const std::string& storage) const {
 
 Phonebooks::Book* Phonebooks::FindBook(const std::string& storage) {
     return const_cast<Book*>(static_cast<const Phonebooks*>(this)->Find(storage));
+}
+
+bool Phonebooks::SetCharset(const std::string& charset) {
+    for (const char* known : {"8859-1", "IRA", "GSM", "UCS2"}) {
+        if (charset == known) {
+            charset_ = charset;
+            return true;
+        }
+    }
+    return false;
+}
+
+std::string Phonebooks::TextToLine(const std::string& latin) const {
+    if (charset_ == "8859-1") return latin;
+    std::string line;
+    for (char c : latin) {
+        const auto byte = static_cast<uint8_t>(c);
+        if (charset_ == "UCS2") {
+            char hex[5];
+            IntToHex(byte, hex, sizeof hex, 4);
+            line += hex;
+        } else if (charset_ == "GSM") {
+            const int code = LatinToGsmCode(byte);
+            line.push_back(code < 0 ? '?' : static_cast<char>(code));
+        } else {
+            line.push_back(byte < 0x80 ? c : '?');
+        }
+    }
+    return line;
+}
+
+bool Phonebooks::TextFromLine(const std::string& line, std::string& latin) const {
+    latin.clear();
+    if (charset_ == "UCS2") {
+        if (line.size() % 4) return false;
+        for (size_t i = 0; i < line.size(); i += 4) {
+            const int unit = HexToInt(line.data() + i, line.data() + line.size(), 4);
+            if (unit < 0) return false;
+            latin.push_back(LatinOrQuestionMark(static_cast<char16_t>(unit)));
+        }
+        return true;
+    }
+    for (char c : line) {
+        const auto byte = static_cast<uint8_t>(c);
+        if (charset_ == "GSM") {
+            if (byte > 0x7F) return false;
+            const int latinByte = GsmCodeToLatin(byte);
+            latin.push_back(latinByte < 0 ? '?' : static_cast<char>(latinByte));
+        } else if (charset_ == "IRA" && byte > 0x7F) {
+            return false;
+        } else {
+            latin.push_back(c);
+        }
+    }
+    return true;
 }
 
 void Phonebooks::Changed() {
@@ -190,7 +246,8 @@ Handled Phonebooks::Read(const std::string& parameters, std::string& info) {
     // Empty places are simply not listed; a range with nothing in it answers OK alone.
     for (auto it = book.entries.lower_bound(first); it != book.entries.end() && it->first <= last;
          ++it)
-        info += EntryLine(it->first, it->second);
+        info +=
+            EntryLine(it->first, it->second.number, it->second.type, TextToLine(it->second.text));
     return Handled::Ok;
 }
 
@@ -208,7 +265,11 @@ Handled Phonebooks::Write(const std::string& parameters) {
         return Handled::Ok;
     }
     if (!fields[1].quoted) return Handled::Error;
-    const std::string& number = fields[1].value;
+    // Numbers go out as plain digits in every character set; one that comes in encoded
+    // (UCS2 hex) is taken back to its digits.
+    std::string number;
+    if (!(charset_ == "UCS2" && TextFromLine(fields[1].value, number) && DialableNumber(number)))
+        number = fields[1].value;
     int type = !number.empty() && number[0] == '+' ? 145 : 129;
     if (fields.size() >= 3 && !fields[2].value.empty()) {
         if (fields[2].quoted || !WholeNumber(fields[2].value, &type) || type < 128 || type > 255)
@@ -217,7 +278,7 @@ Handled Phonebooks::Write(const std::string& parameters) {
     std::string text;
     if (fields.size() == 4) {
         if (!fields[3].quoted && !fields[3].value.empty()) return Handled::Error;
-        text = fields[3].value;
+        if (!TextFromLine(fields[3].value, text)) return Handled::Error;
     }
     if (fields[0].value.empty()) {
         // No index: the first free place. A full book is the card's "memory full".

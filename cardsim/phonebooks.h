@@ -38,6 +38,12 @@ class Phonebooks : public CommandSet {
     // nullptr for a storage this card does not have.
     const Book* Find(const std::string& storage) const;
 
+    // The character set of names on the line (+CSCS): "8859-1" (what the dialer selects),
+    // "IRA", "GSM" or "UCS2". Names are kept in ISO 8859-1 whatever the line uses. False for a
+    // set the card does not know, which leaves the current one.
+    bool SetCharset(const std::string& charset);
+    const std::string& Charset() const { return charset_; }
+
   private:
     Book* FindBook(const std::string& storage);
     Handled Write(const std::string& parameters);
@@ -46,9 +52,14 @@ class Phonebooks : public CommandSet {
     std::string Put(Book& book, int index, const std::string& number, int type,
                     const std::string& text);
     void Changed();
+    std::string TextToLine(const std::string& latin) const;
+    // The name or number as it came on the line back into ISO 8859-1; false when it is not
+    // valid in the current character set.
+    bool TextFromLine(const std::string& line, std::string& latin) const;
 
     Book books_[2];
     int selected_ = 0;  // index into books_; the SIM after power-up, as on a real card
+    std::string charset_ = "8859-1";
 };
 
 }  // namespace vqm::cardsim
