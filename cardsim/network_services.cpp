@@ -114,6 +114,7 @@ void Line(std::string& info, const std::string& text) {
 bool ParseNetworks(const std::string& text, std::vector<NetworkServices::Network>* out) {
     out->clear();
     if (text == "none") return true;
+    if (text.empty() || text.back() == ',') return false;
     std::istringstream items(text);
     std::string item;
     while (std::getline(items, item, ',')) {
