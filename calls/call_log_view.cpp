@@ -83,6 +83,11 @@ CallLogView::CallLogView(QWidget* parent, ShellContext& context, CallLog* callLo
     }
     const int top = 2 + kCallLogLabelHeight + 2;
     CreateTabbedPages(this, kCallLogTabId, pages_, QRect(0, top, width(), height() - top));
+    // Three titles share a narrow strip: squeeze them in rather than scroll.
+    if (auto* tabs = qobject_cast<QTabBar*>(FindControl(this, kCallLogTabId))) {
+        tabs->setUsesScrollButtons(false);
+        tabs->setExpanding(true);
+    }
     Relayout();
 
     EnsureCallLogLimits(*callLog_);
@@ -118,8 +123,11 @@ QTreeWidget* CallLogView::MakeList(QWidget* page, int log) {
     list->setColumnWidth(kColumnCall, 95);
     list->setColumnWidth(kColumnDateTime, 135);
     // The number and the sequence number stay with each row for the commands, unseen.
-    list->setColumnHidden(kColumnNumber, true);
-    list->setColumnHidden(kColumnSequence, true);
+    list->header()->setMinimumSectionSize(0);
+    for (int column : {kColumnNumber, kColumnSequence}) {
+        list->setColumnWidth(column, 0);
+        list->setColumnHidden(column, true);
+    }
     list->setRootIsDecorated(false);
     list->setUniformRowHeights(true);
     list->setSelectionMode(QAbstractItemView::ExtendedSelection);
