@@ -72,8 +72,8 @@ TEST_F(ModemCommandTest, IsdnV120At19200GoesToTheSettingTheDriverAndWvdial) {
         EXPECT_NE(entry.path().extension(), ".tmp") << entry.path();  // copies renamed away
 }
 
-TEST_F(ModemCommandTest, TheTableCoversEveryMethodAndSpeedOnce) {
-    // Each method keeps one bearer for the faster speeds; the 9.6 row of ISDN is its own.
+TEST_F(ModemCommandTest, TheIsdnRowsAndTheTablesBounds) {
+    // The 9.6 row of the ISDN methods has its own bearer speeds; the faster rows share one.
     EXPECT_EQ(std::u16string(ModemCommand(0, 4)), u"AT+CBST=0,0,1;+CHSN=6,0,0,0");
     EXPECT_EQ(std::u16string(ModemCommand(2, 0)), u"AT+CBST=39,0,1;+CHSN=1,0,0,0");
     EXPECT_EQ(std::u16string(ModemCommand(1, 1)), u"AT+CBST=81,0,1;+CHSN=2,0,0,0");
