@@ -37,19 +37,6 @@ PhonebookEntry Marked() {
     return e;
 }
 
-TEST(PhonebookStorageTable, FixedOrderAndCodes) {
-    const char* expected[] = {"DC", "EN", "FD", "MC", "ME", "ON", "RC", "SM"};
-    for (int i = 0; i < kPhonebookStorageCount; ++i) {
-        EXPECT_STREQ(PhonebookStorageName(i), expected[i]);
-        EXPECT_EQ(PhonebookStorageIndex(expected[i]), i);
-    }
-    EXPECT_EQ(PhonebookStorageName(-1), nullptr);
-    EXPECT_EQ(PhonebookStorageName(8), nullptr);
-    EXPECT_EQ(PhonebookStorageIndex("sm"), -1);  // codes are exact
-    EXPECT_EQ(PhonebookStorageIndex("SMX"), -1);
-    EXPECT_EQ(PhonebookStorageIndex(nullptr), -1);
-}
-
 TEST(PhonebookEntryLine, ReadsTheFourFieldsWithLatinName) {
     Reply line(" 17,\"+447700900123\",145,\"Chlo\xE9 Martin\"\r\n\r\nOK\r\n");
     PhonebookEntry e = Marked();
