@@ -1,4 +1,5 @@
 #include "cardsim/command_set.h"
+#include "cardsim/message_memory.h"
 #include "cardsim/network_services.h"
 #include "cardsim/phonebooks.h"
 
@@ -8,6 +9,7 @@ std::vector<std::unique_ptr<CommandSet>> StandardCommandSets() {
     std::vector<std::unique_ptr<CommandSet>> sets;
     sets.push_back(std::make_unique<NetworkServices>());
     sets.push_back(std::make_unique<Phonebooks>());
+    sets.push_back(std::make_unique<MessageMemory>());
     return sets;
 }
 
