@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
-# gammu, a third-party AT client, against the simulated card: it must identify the card and read
-# its demo SIM and card phonebooks as it would a real modem's. Usage: gammu_peer_test.sh VQM-CARDSIM
+# gammu, a third-party AT client, against the simulated card: it must identify the card, read its
+# demo SIM and card phonebooks and its messages, and send a message, as it would with a real modem.
+# Usage: gammu_peer_test.sh VQM-CARDSIM
 # Exits 77 (skipped) when gammu is not installed.
 set -u
 cardsim=$1
@@ -77,4 +78,13 @@ count=$(grep -c "^Memory SM, Location" "$tmp/out")
 [ "$count" -eq 7 ] || fail "after a delete: $count entries instead of 7"
 grep -qF '"Bob Jones"' "$tmp/out" && fail "the deleted entry is still listed"
 
-echo "gammu identified the card and read its phonebooks"
+# Messages: one delivered from the network side is listed, and a message gammu sends is taken.
+"$cardsim" --runtime-dir "$tmp/run" ctl deliver +447700900123 Peer check delivery >/dev/null ||
+    fail "the network-side delivery was refused"
+run_gammu --getallsms
+expect '"+447700900123"' "message list"
+expect "Peer check delivery" "message list"
+run_gammu --sendsms TEXT +447700900456 -text "Peer check from gammu"
+expect "OK, message reference" "send"
+
+echo "gammu identified the card, read its phonebooks and messages, and sent one"
