@@ -4,7 +4,7 @@ VQM_PACKAGES=(
     libgtest-dev libgmock-dev libbenchmark-dev
     libsqlite3-dev sqlite3
     qt6-base-dev qt6-qpa-plugins libx11-dev libxext-dev dbus
-    clang-format gammu
+    clang-format gammu libgammu-dev
 )
 
 # Installs whatever of the list is missing; nothing is fetched when all is there.
