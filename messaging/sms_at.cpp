@@ -156,12 +156,9 @@ int SmsSelectSimStorage(Link& link, int32_t* used, int32_t* total) {
     if (length == 0) return 0;
     const char* end = reply + length;
     const char* p = AfterTag("+CPMS:", reply, length);
-    int32_t usedCount = 0, totalCount = 0;
-    if (!p || !(p = ParseInt(p, end, &usedCount)) || p >= end || *p != ',') return 0;
-    if (!ParseInt(p + 1, end, &totalCount)) return 0;
-    if (used) *used = usedCount;
-    if (total) *total = totalCount;
-    return 1;
+    int32_t ignored;
+    if (!p || !(p = ParseInt(p, end, used ? used : &ignored)) || p >= end || *p != ',') return 0;
+    return ParseInt(p + 1, end, total ? total : &ignored) ? 1 : 0;
 }
 
 int SmsStorageUsed(Link& link) {
