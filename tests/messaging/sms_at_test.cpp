@@ -340,6 +340,24 @@ TEST_F(ScriptedSmsTest, StorageReplies) {
     EXPECT_EQ(Commands().back(), "AT+CPMS=\"SM\",\"SM\",\"SM\"");
 }
 
+TEST_F(ScriptedSmsTest, CommandTexts) {
+    Answer("AT", "\r\nOK\r\n");
+    Answer("AT+CMGW=", "\r\n> ");
+    SmsRecord record{};
+    record.index = 3;
+    SmsRead(link_, kSmsModePdu, &record);
+    SmsRead(link_, kSmsModeText, &record);
+    SmsGetFormat(link_);
+    SmsSetFormat(link_, 0);
+    SmsSetCharset(link_, "8859-1");
+    SmsStorageUsed(link_);
+    SmsRecord message = Message("+4412", "x");
+    SmsWrite(link_, kSmsModeText, &message);
+    EXPECT_EQ(Commands(), (std::vector<std::string>{"AT+CMGR=3", "AT+CMGR=3", "AT+CMGF?",
+                                                    "AT+CMGF=0", "AT+CSCS=\"8859-1\"", "AT+CPMS?",
+                                                    "AT+CMGW=\"+4412\"", "x"}));
+}
+
 TEST_F(ScriptedSmsTest, PromptAndConfirmation) {
     SmsRecord message = Message("+4412", "");
     // No prompt: the body is never sent.
