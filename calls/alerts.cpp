@@ -108,9 +108,12 @@ int OnIncomingCall(DialPad& pad, const EventRecord&) {
     // A call being dialled or talked on keeps the pad: this dialer does not take a second one.
     if (pad.CallState() == kCallDialing || pad.CallState() == kCallVoice) return 0;
     DialPadUi& ui = pad.Ui();
+    // The card repeats the ring every few seconds: a repeat leaves the caller's name and
+    // number standing instead of blanking them until the next caller id.
+    const bool repeat = pad.CallState() == kCallRinging;
     pad.EnterRinging();
     ui.BringDialPadForward();
-    ui.ShowStatus(u"Incoming call", u"");
+    if (!repeat) ui.ShowStatus(u"Incoming call", u"");
     ui.DisplayOnIfOff();
     ui.StartRingTone();
     return 0;

@@ -3,7 +3,7 @@ VQM_PACKAGES=(
     build-essential cmake ninja-build pkg-config
     libgtest-dev libgmock-dev libbenchmark-dev
     libsqlite3-dev sqlite3
-    qt6-base-dev qt6-qpa-plugins libx11-dev libxext-dev dbus
+    qt6-base-dev qt6-multimedia-dev qt6-qpa-plugins libx11-dev libxext-dev dbus
     clang-format gammu libgammu-dev
 )
 
