@@ -13,6 +13,7 @@
 #include <cstring>
 #include <vector>
 
+#include "calls/dial_pad_view.h"
 #include "shell/messages.h"
 #include "support/numbers.h"
 #include "support/text.h"
@@ -353,7 +354,9 @@ void CallLogView::DeleteSelected(int log) {
 }
 
 View* CreateCallLogView(QWidget* parent, ShellContext& context) {
-    return new CallLogView(parent, context);
+    return new CallLogView(
+        parent, context, nullptr, nullptr,
+        [&context](const std::u16string& number) { return DialFromAnywhere(context, number); });
 }
 
 }  // namespace vqm
