@@ -29,6 +29,16 @@ bool NumberAfter(const std::string& text, size_t at, int* value) {
     return true;
 }
 
+// The ';' that ends a chained command; one inside quotes belongs to a name or a text.
+size_t NextSeparator(const std::string& body, size_t from) {
+    bool quoted = false;
+    for (size_t i = from; i < body.size(); ++i) {
+        if (body[i] == '"') quoted = !quoted;
+        if (body[i] == ';' && !quoted) return i;
+    }
+    return std::string::npos;
+}
+
 }  // namespace
 
 float CardEngine::FirmwareVersion() const {
@@ -119,7 +129,7 @@ void CardEngine::RunLine(const std::string& rawLine, Clock::time_point now) {
     } else {
         size_t start = 0;
         while (ok && !prompting_ && start <= body.size()) {
-            size_t end = body.find(';', start);
+            size_t end = NextSeparator(body, start);
             std::string part =
                 body.substr(start, end == std::string::npos ? std::string::npos : end - start);
             if (!part.empty() || start == 0) ok = RunCommand(part, info, errorText, deferred, now);
@@ -147,17 +157,37 @@ bool CardEngine::RunCommand(const std::string& command, std::string& info, std::
     }
     if (upper == "&F" || upper == "Z") {
         echo_ = true;
+        charset_ = "8859-1";
         return true;
     }
     if (upper.size() == 2 && upper[0] == 'X' && upper[1] >= '0' && upper[1] <= '5') return true;
-    for (const char* setting : {"+CSCS=", "+CLIP=", "+CRC=", "+CNMI=", "+CMEE="})
+    // The character set of names and texts on the line; the groups that carry text read it.
+    if (upper == "+CSCS=?") return line("+CSCS: (\"GSM\",\"IRA\",\"8859-1\",\"UCS2\")"), true;
+    if (upper == "+CSCS?") return line("+CSCS: \"" + charset_ + "\""), true;
+    if (StartsWith(upper, "+CSCS=")) {
+        std::string wanted = upper.substr(6);
+        if (wanted.size() >= 2 && wanted.front() == '"' && wanted.back() == '"')
+            wanted = wanted.substr(1, wanted.size() - 2);
+        if (wanted != "GSM" && wanted != "IRA" && wanted != "8859-1" && wanted != "UCS2")
+            return false;
+        charset_ = wanted;
+        return true;
+    }
+    // Clients check that the radio is on; it always is while the card is powered.
+    if (upper == "+CFUN?") return line("+CFUN: 1"), true;
+    if (upper == "+CFUN=1" || upper == "+CFUN=1,0") return true;
+    if (upper == "+CIMI") return line("202015550123456"), true;
+    for (const char* setting : {"+CLIP=", "+CRC=", "+CNMI=", "+CMEE="})
         if (StartsWith(upper, setting)) return upper.size() > std::string(setting).size();
     if (upper == "+GMI" || upper == "+CGMI") return line("Tavro Mobile Phones"), true;
     if (upper == "+GMM" || upper == "+CGMM") return line("TAVRO CARD PHONE 2.0"), true;
     if (upper == "+GMR" || upper == "+CGMR") return line(config_.firmware), true;
     if (upper == "+CGSN" || upper == "+GSN") return line("490154203237518"), true;
     if (upper == "+CSQ") return line("+CSQ: " + std::to_string(config_.signalQuality) + ",0"), true;
-    if (upper == "+COPS?") return line("+COPS: 0,2," + std::to_string(config_.operatorCode)), true;
+    if (upper == "+COPS?")
+        return line("+COPS: " + std::to_string(config_.selectionMode) + ",2," +
+                    std::to_string(config_.operatorCode)),
+               true;
     if (upper == "+CLVL?") return line("+CLVL: " + std::to_string(volume_)), true;
     if (StartsWith(upper, "+CLVL=")) {
         int level;

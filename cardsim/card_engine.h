@@ -19,6 +19,7 @@ struct EngineConfig {
     std::string firmware = "SW4.00";  // "SW3.80" and below send the caller's number unquoted
     int signalQuality = 20;           // +CSQ, 0..31 or 99
     int operatorCode = 20201;         // +COPS numeric
+    int selectionMode = 0;            // +COPS: 0 automatic, 1 manual
     int dialDelayMs = 2000;           // from ATD until the far end decides
     int ringRepeatMs = 3000;          // +CRING/+CLIP repeat while ringing
     int ringTimeoutMs = 30000;        // the caller gives up
@@ -89,6 +90,8 @@ class CardEngine {
     }
 
     bool Echo() const { return echo_; }
+    // "8859-1", "GSM", "IRA" or "UCS2", as the client last chose with AT+CSCS.
+    const std::string& Charset() const { return charset_; }
     int Volume() const { return volume_; }
     CallState State() const { return state_; }
     const std::string& CallNumber() const { return callNumber_; }
@@ -113,6 +116,7 @@ class CardEngine {
     bool commandRunning_ = false;  // a deferred ATD is waiting for the network
     bool discardLine_ = false;     // the rest of a line that aborted a dial
     int volume_ = 5;
+    std::string charset_ = "8859-1";
     std::vector<std::unique_ptr<CommandSet>> sets_;
     CommandSet* prompting_ = nullptr;  // the group whose "> " prompt is collecting text
     std::string promptText_;

@@ -259,7 +259,7 @@ std::string CardSim::RunScript(const std::string& script, const std::function<vo
 void CardSim::LoadState() {
     std::ifstream file;
     if (!config_.stateFile.empty()) file.open(config_.stateFile);
-    if (!file) {
+    if (!file.is_open()) {
         // A card that has never run comes with the demo SIM.
         for (const auto& set : engine_.CommandSets())
             set->FillDemo();

@@ -133,7 +133,6 @@ bool ParseNetworks(const std::string& text, std::vector<NetworkServices::Network
 
 void NetworkServices::FillDemo() {
     networks_ = {{20201, 2}, {20205, 1}, {20210, 1}, {20801, 3}};
-    selectionMode_ = 0;
     forwards_ = {};
     barred_ = {};
     locked_ = {false, true, false};  // PIN2 is always asked for; PIN and phone lock are off
@@ -235,7 +234,7 @@ Handled NetworkServices::RunCops(const std::string& args, bool list, std::string
     if (!FieldInt(fields, 0, 0, 4, &mode)) return Handled::Error;
     if (mode == 0) {
         if (fields.size() > 2) return Handled::Error;
-        selectionMode_ = 0;
+        engine_->ChangeConfig().selectionMode = 0;
         // Automatic selection stays on the current network while it may be used.
         bool currentUsable = networks_.empty();
         for (const Network& network : networks_)
@@ -265,7 +264,7 @@ Handled NetworkServices::RunCops(const std::string& args, bool list, std::string
         if (network.code == code) found = &network;
     if (!found) return Cme(errorText, kNoNetwork);
     if (found->status == 3) return Cme(errorText, kNotAllowed);
-    selectionMode_ = 1;
+    engine_->ChangeConfig().selectionMode = 1;
     if (engine_) engine_->ChangeConfig().operatorCode = code;
     return Handled::Ok;
 }
@@ -474,7 +473,7 @@ void NetworkServices::Save(std::ostream& out) const {
     if (networks_.empty()) out << "none";
     for (size_t i = 0; i < networks_.size(); ++i)
         out << (i ? "," : "") << networks_[i].code << ":" << networks_[i].status;
-    out << "\nnet-mode " << selectionMode_ << "\n";
+    out << "\nnet-mode " << engine_->Config().selectionMode << "\n";
     for (int r = 0; r < kReasons; ++r)
         for (int c = 0; c < kClasses; ++c) {
             const Forward& forward = forwards_[r][c];
@@ -505,7 +504,7 @@ bool NetworkServices::Load(const std::string& name, const std::string& rest) {
         if (ParseNetworks(list, &parsed)) networks_ = parsed;
     } else if (name == "net-mode") {
         int mode = 0;
-        if (words >> mode && (mode == 0 || mode == 1)) selectionMode_ = mode;
+        if (words >> mode && (mode == 0 || mode == 1)) engine_->ChangeConfig().selectionMode = mode;
     } else if (name == "net-forward") {
         int reason = -1, bit = 0, type = 0, seconds = 0, active = 0;
         std::string number;

@@ -51,7 +51,6 @@ class NetworkServices : public CommandSet {
     std::string& PasswordFor(int lockOrBarring);
 
     std::vector<Network> networks_;
-    int selectionMode_ = 0;  // 0 automatic, 1 manual
     std::array<std::array<Forward, kClasses>, kReasons> forwards_{};
     std::array<int, kBarrings> barred_{};  // class bits barred per facility
     std::array<bool, kLocks> locked_{};

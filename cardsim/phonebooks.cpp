@@ -117,26 +117,21 @@ Phonebooks::Book* Phonebooks::FindBook(const std::string& storage) {
     return const_cast<Book*>(static_cast<const Phonebooks*>(this)->Find(storage));
 }
 
-bool Phonebooks::SetCharset(const std::string& charset) {
-    for (const char* known : {"8859-1", "IRA", "GSM", "UCS2"}) {
-        if (charset == known) {
-            charset_ = charset;
-            return true;
-        }
-    }
-    return false;
+const std::string& Phonebooks::Charset() const {
+    static const std::string kLatin = "8859-1";
+    return engine_ ? engine_->Charset() : kLatin;
 }
 
 std::string Phonebooks::TextToLine(const std::string& latin) const {
-    if (charset_ == "8859-1") return latin;
+    if (Charset() == "8859-1") return latin;
     std::string line;
     for (char c : latin) {
         const auto byte = static_cast<uint8_t>(c);
-        if (charset_ == "UCS2") {
+        if (Charset() == "UCS2") {
             char hex[5];
             IntToHex(byte, hex, sizeof hex, 4);
             line += hex;
-        } else if (charset_ == "GSM") {
+        } else if (Charset() == "GSM") {
             const int code = LatinToGsmCode(byte);
             line.push_back(code < 0 ? '?' : static_cast<char>(code));
         } else {
@@ -148,7 +143,7 @@ std::string Phonebooks::TextToLine(const std::string& latin) const {
 
 bool Phonebooks::TextFromLine(const std::string& line, std::string& latin) const {
     latin.clear();
-    if (charset_ == "UCS2") {
+    if (Charset() == "UCS2") {
         if (line.size() % 4) return false;
         for (size_t i = 0; i < line.size(); i += 4) {
             const int unit = HexToInt(line.data() + i, line.data() + line.size(), 4);
@@ -159,11 +154,11 @@ bool Phonebooks::TextFromLine(const std::string& line, std::string& latin) const
     }
     for (char c : line) {
         const auto byte = static_cast<uint8_t>(c);
-        if (charset_ == "GSM") {
+        if (Charset() == "GSM") {
             if (byte > 0x7F) return false;
             const int latinByte = GsmCodeToLatin(byte);
             latin.push_back(latinByte < 0 ? '?' : static_cast<char>(latinByte));
-        } else if (charset_ == "IRA" && byte > 0x7F) {
+        } else if (Charset() == "IRA" && byte > 0x7F) {
             return false;
         } else {
             latin.push_back(c);
@@ -268,7 +263,7 @@ Handled Phonebooks::Write(const std::string& parameters) {
     // Numbers go out as plain digits in every character set; one that comes in encoded
     // (UCS2 hex) is taken back to its digits.
     std::string number;
-    if (!(charset_ == "UCS2" && TextFromLine(fields[1].value, number) && DialableNumber(number)))
+    if (!(Charset() == "UCS2" && TextFromLine(fields[1].value, number) && DialableNumber(number)))
         number = fields[1].value;
     int type = !number.empty() && number[0] == '+' ? 145 : 129;
     if (fields.size() >= 3 && !fields[2].value.empty()) {

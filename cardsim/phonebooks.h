@@ -38,11 +38,9 @@ class Phonebooks : public CommandSet {
     // nullptr for a storage this card does not have.
     const Book* Find(const std::string& storage) const;
 
-    // The character set of names on the line (+CSCS): "8859-1" (what the dialer selects),
-    // "IRA", "GSM" or "UCS2". Names are kept in ISO 8859-1 whatever the line uses. False for a
-    // set the card does not know, which leaves the current one.
-    bool SetCharset(const std::string& charset);
-    const std::string& Charset() const { return charset_; }
+    // The character set of names on the line, as the client chose it with AT+CSCS (the
+    // engine keeps it). Names are kept in ISO 8859-1 whatever the line uses.
+    const std::string& Charset() const;
 
   private:
     Book* FindBook(const std::string& storage);
@@ -59,7 +57,6 @@ class Phonebooks : public CommandSet {
 
     Book books_[2];
     int selected_ = 0;  // index into books_; the SIM after power-up, as on a real card
-    std::string charset_ = "8859-1";
 };
 
 }  // namespace vqm::cardsim

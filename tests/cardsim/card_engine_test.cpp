@@ -200,3 +200,50 @@ TEST(CommandGroups, PromptCollectsTextUntilCtrlZAndEscapeCancels) {
 
 }  // namespace
 }  // namespace vqm::cardsim
+
+namespace vqm::cardsim {
+namespace {
+
+TEST(CoreQueries, CharacterSetIsKeptAndTheRadioReportsOn) {
+    CardEngine engine;
+    const auto now = Clock::time_point{} + std::chrono::hours(1);
+    auto send = [&](const std::string& text) {
+        engine.Feed(text.data(), text.size(), now);
+        return engine.TakeOutput();
+    };
+    send("ATE0\r");
+    EXPECT_EQ(send("AT+CSCS?\r"), "\r\n+CSCS: \"8859-1\"\r\n\r\nOK\r\n");
+    EXPECT_EQ(send("AT+CSCS=\"GSM\"\r"), "\r\nOK\r\n");
+    EXPECT_EQ(engine.Charset(), "GSM");
+    EXPECT_EQ(send("AT+CSCS=\"KOI8\"\r"), "\r\nERROR\r\n");
+    EXPECT_EQ(engine.Charset(), "GSM");
+    EXPECT_NE(send("AT+CSCS=?\r").find("\"UCS2\""), std::string::npos);
+    EXPECT_EQ(send("AT&F\r"), "\r\nOK\r\n");
+    EXPECT_EQ(engine.Charset(), "8859-1");  // back to what the dialer sets
+    send("ATE0\r");
+    EXPECT_EQ(send("AT+CFUN?\r"), "\r\n+CFUN: 1\r\n\r\nOK\r\n");
+    EXPECT_EQ(send("AT+CIMI\r"), "\r\n202015550123456\r\n\r\nOK\r\n");
+}
+
+}  // namespace
+}  // namespace vqm::cardsim
+
+namespace vqm::cardsim {
+namespace {
+
+TEST(CoreQueries, ASemicolonInsideQuotesDoesNotChainACommand) {
+    CardEngine engine;
+    auto group = std::make_unique<PromptedGroup>();
+    engine.AddCommandSet(std::move(group));
+    const auto now = Clock::time_point{} + std::chrono::hours(1);
+    const std::string line = "ATE0;+CSCS=\"IRA;\";+XI\r";
+    engine.Feed(line.data(), line.size(), now);
+    // "IRA;" is one (unknown) set, not "IRA" followed by a command "\"".
+    EXPECT_EQ(engine.TakeOutput(), line + "\r\nERROR\r\n");
+    const std::string chained = "AT+CSCS=\"IRA\";+XI\r";
+    engine.Feed(chained.data(), chained.size(), now);
+    EXPECT_EQ(engine.TakeOutput(), "\r\n+XI: 1\r\n\r\nOK\r\n");
+}
+
+}  // namespace
+}  // namespace vqm::cardsim

@@ -39,7 +39,7 @@ TEST_F(CardPhonebooksTest, NamesTravelInTheSelectedCharacterSet) {
     EXPECT_EQ(Send("AT+CPBW=1,\"+447700900789\",145,\"Chlo\xE9\""), "\r\nOK\r\n");
     EXPECT_EQ(Send("AT+CPBR=1"), "\r\n+CPBR: 1,\"+447700900789\",145,\"Chlo\xE9\"\r\n\r\nOK\r\n");
 
-    ASSERT_TRUE(books_->SetCharset("UCS2"));
+    ASSERT_EQ(Send("AT+CSCS=\"UCS2\""), "\r\nOK\r\n");
     EXPECT_EQ(Send("AT+CPBR=1"),
               "\r\n+CPBR: 1,\"+447700900789\",145,\"00430068006C006F00E9\"\r\n\r\nOK\r\n");
     // A name beyond ISO 8859-1 is kept with '?' for what the card cannot store; a number may
@@ -50,19 +50,19 @@ TEST_F(CardPhonebooksTest, NamesTravelInTheSelectedCharacterSet) {
     EXPECT_EQ(Stored(2)->text, "A?");
     EXPECT_NE(Send("AT+CPBW=3,\"0123\",129,\"00E\""), "\r\nOK\r\n");  // not whole units
 
-    ASSERT_TRUE(books_->SetCharset("GSM"));
+    ASSERT_EQ(Send("AT+CSCS=\"GSM\""), "\r\nOK\r\n");
     // e-acute is code 0x05 in the default alphabet; '@' is code 0x00.
     EXPECT_EQ(Send("AT+CPBR=1"), "\r\n+CPBR: 1,\"+447700900789\",145,\"Chlo\x05\"\r\n\r\nOK\r\n");
     EXPECT_EQ(Send("AT+CPBW=4,\"0123\",129,\"a" + std::string(1, '\0') + "b\x04\""), "\r\nOK\r\n");
     EXPECT_EQ(Stored(4)->text, "a@b\xE8");
 
-    ASSERT_TRUE(books_->SetCharset("IRA"));
+    ASSERT_EQ(Send("AT+CSCS=\"IRA\""), "\r\nOK\r\n");
     EXPECT_EQ(Send("AT+CPBR=1"), "\r\n+CPBR: 1,\"+447700900789\",145,\"Chlo?\"\r\n\r\nOK\r\n");
     EXPECT_NE(Send("AT+CPBW=5,\"0123\",129,\"\xE9\""), "\r\nOK\r\n");
     EXPECT_EQ(Stored(5), nullptr);
 
-    EXPECT_FALSE(books_->SetCharset("UTF-8"));
-    EXPECT_EQ(books_->Charset(), "IRA");
+    EXPECT_EQ(Send("AT+CSCS=\"UTF-8\""), "\r\nERROR\r\n");
+    EXPECT_EQ(Send("AT+CPBR=1"), "\r\n+CPBR: 1,\"+447700900789\",145,\"Chlo?\"\r\n\r\nOK\r\n");
 }
 
 TEST_F(CardPhonebooksTest, QuotedCommasAndMalformedWritesChangeNothing) {

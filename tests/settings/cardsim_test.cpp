@@ -79,6 +79,7 @@ TEST_F(SettingsCardTest, SearchRegisterAndAutomaticSelection) {
 
     EXPECT_EQ(NetworkRegister(*link_, names[1]), 0);
     EXPECT_EQ(Operator(), u"PANAFON");
+    EXPECT_EQ(NetworkMode(*link_), 1);  // chosen by hand
     const int refused = NetworkRegister(*link_, names[3]);
     EXPECT_TRUE(refused == -1 || refused == 4) << refused;
     EXPECT_EQ(Operator(), u"PANAFON");
@@ -89,6 +90,7 @@ TEST_F(SettingsCardTest, SearchRegisterAndAutomaticSelection) {
     EXPECT_EQ(NetworkRegister(*link_, u"MOVISTAR"), 0);
     EXPECT_NE(sim_->Control("status").find("operator=21402"), std::string::npos);
     EXPECT_EQ(NetworkAutomatic(*link_), 0);
+    EXPECT_EQ(NetworkMode(*link_), 0);
 }
 
 TEST_F(SettingsCardTest, ForwardingPerClassAndReason) {

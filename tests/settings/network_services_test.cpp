@@ -38,7 +38,7 @@ TEST_F(NetworkServicesTest, OperatorListFollowsRegistrationAndTheNetworkSide) {
     EXPECT_EQ(Send("AT+COPS=?"), Info("\r\n+COPS: 2,,,20201,1,,,20205,1,,,20210,3,,,20801,"));
     EXPECT_EQ(Send("AT+COPS=1,2,20205"), kOk);
     EXPECT_EQ(engine_.Config().operatorCode, 20205);
-    EXPECT_EQ(Send("AT+COPS?"), Info("\r\n+COPS: 0,2,20205"));
+    EXPECT_EQ(Send("AT+COPS?"), Info("\r\n+COPS: 1,2,20205"));  // manual now
     EXPECT_EQ(Send("AT+COPS=?"), Info("\r\n+COPS: 1,,,20201,2,,,20205,1,,,20210,3,,,20801,"));
     EXPECT_EQ(Send("AT+COPS=1,2,20801"), "\r\n+CME ERROR: 3\r\n");  // forbidden
     EXPECT_EQ(Send("AT+COPS=1,2,\"99999\""), "\r\n+CME ERROR: 30\r\n");
