@@ -11,9 +11,7 @@
 #include <string>
 #include <vector>
 
-#include "cardsim/card_sim.h"
-#include "link/link.h"
-#include "support/settings_store.h"
+#include "bench/bench_card.h"
 
 namespace {
 
@@ -21,12 +19,6 @@ struct Transaction {
     const char* name;
     std::string command;
 };
-
-double Median(std::vector<double> values) {
-    std::sort(values.begin(), values.end());
-    const size_t n = values.size();
-    return n % 2 ? values[n / 2] : (values[n / 2 - 1] + values[n / 2]) / 2;
-}
 
 }  // namespace
 
@@ -45,19 +37,11 @@ int main(int argc, char** argv) {
             return std::strcmp(argv[i], "--help") ? 2 : 0;
         }
     }
-    char folder[] = "/tmp/vqm-bench-XXXXXX";
-    if (!mkdtemp(folder)) return 1;
-    const std::string root = folder;
-
-    vqm::cardsim::SimConfig config;
-    config.baud = baud;
-    config.runtimeDir = root + "/run";
-    config.engine.dialDelayMs = 0;
-    vqm::cardsim::CardSim card(config);
-    vqm::SettingsStore settings(root + "/settings.db");
-    vqm::Link link(settings, vqm::DriverRoots{root + "/run", root + "/no-tty"});
+    vqm::bench::BenchCard bench(
+        baud, [](vqm::cardsim::SimConfig& config) { config.engine.dialDelayMs = 0; });
+    vqm::Link& link = bench.GetLink();
     int status = 1;
-    if (card.PowerUp() && vqm::PortOpenDevice(link, card.DevicePath().c_str())) {
+    if (bench.Up()) {
         char reply[1024];
         // One call in progress, so that AT+CLCC lists it.
         vqm::AtCommand(link, "ATD0123456789;\r", reply, sizeof reply);
@@ -83,8 +67,8 @@ int main(int argc, char** argv) {
             }
             // The command goes out, comes back as its echo, and the reply follows.
             const double bytes = 2.0 * t.command.size() + length;
-            const double floorMs = bytes * 10 * 1000 / baud + 100 + 200;
-            const double median = Median(times);
+            const double floorMs = vqm::bench::LineFloorMs(bytes, baud);
+            const double median = vqm::bench::Median(times);
             const double ratio = median / floorMs;
             std::printf("%-20s %6zu %6u %10.1f %10.1f %10.1f %7.3f\n", t.name, t.command.size(),
                         length, floorMs, median, *std::max_element(times.begin(), times.end()),
@@ -95,9 +79,5 @@ int main(int argc, char** argv) {
     } else {
         std::fprintf(stderr, "vqm-link-bench: the simulated card did not come up\n");
     }
-    vqm::PortClose(link);
-    card.PowerDown();
-    std::string remove = "rm -rf '" + root + "'";
-    (void)!std::system(remove.c_str());
     return status;
 }

@@ -11,22 +11,14 @@
 #include <string>
 #include <vector>
 
-#include "cardsim/card_sim.h"
+#include "bench/bench_card.h"
 #include "contacts/phonebook_at.h"
-#include "link/link.h"
-#include "support/settings_store.h"
 
 namespace {
 
 constexpr int kEntries = 250;
 
 using Clock = std::chrono::steady_clock;
-
-double Median(std::vector<double> values) {
-    std::sort(values.begin(), values.end());
-    const size_t n = values.size();
-    return n % 2 ? values[n / 2] : (values[n / 2 - 1] + values[n / 2]) / 2;
-}
 
 // The commands of one full read, in order, as the wrappers format them.
 std::vector<std::string> ReadCommands() {
@@ -70,19 +62,12 @@ int main(int argc, char** argv) {
             return std::strcmp(argv[i], "--help") ? 2 : 0;
         }
     }
-    char folder[] = "/tmp/vqm-bench-XXXXXX";
-    if (!mkdtemp(folder)) return 1;
-    const std::string root = folder;
-
-    vqm::cardsim::SimConfig config;
-    config.baud = baud;
-    config.runtimeDir = root + "/run";
-    vqm::cardsim::CardSim card(config);
-    vqm::SettingsStore settings(root + "/settings.db");
-    vqm::Link link(settings, vqm::DriverRoots{root + "/run", root + "/no-tty"});
+    vqm::bench::BenchCard bench(baud, {}, [](vqm::cardsim::CardSim& card) {
+        return card.Control("phonebook-fill SM " + std::to_string(kEntries)) == "OK";
+    });
+    vqm::Link& link = bench.GetLink();
     int status = 1;
-    if (card.Control("phonebook-fill SM " + std::to_string(kEntries)) == "OK" && card.PowerUp() &&
-        vqm::PortOpenDevice(link, card.DevicePath().c_str())) {
+    if (bench.Up()) {
         // The bytes of each exchange, taken once with the same commands the wrappers send.
         double floorMs = 0;
         size_t lineBytes = 0;
@@ -92,7 +77,7 @@ int main(int argc, char** argv) {
             const unsigned length = vqm::AtCommand(link, command.c_str(), reply, sizeof reply);
             const size_t bytes = 2 * command.size() + length;
             lineBytes += bytes;
-            floorMs += bytes * 10.0 * 1000 / baud + 100 + 200;
+            floorMs += vqm::bench::LineFloorMs(static_cast<double>(bytes), baud);
         }
         std::vector<double> times;
         int found = 0;
@@ -102,7 +87,7 @@ int main(int argc, char** argv) {
             times.push_back(
                 std::chrono::duration<double, std::milli>(Clock::now() - start).count());
         }
-        const double median = Median(times);
+        const double median = vqm::bench::Median(times);
         const double ratio = median / floorMs;
         std::printf("%-28s %9s %7s %10s %10s %10s %7s\n", "transaction", "exchanges", "bytes",
                     "floor ms", "median ms", "worst ms", "ratio");
@@ -114,9 +99,5 @@ int main(int argc, char** argv) {
     } else {
         std::fprintf(stderr, "vqm-phonebook-bench: the simulated card did not come up\n");
     }
-    vqm::PortClose(link);
-    card.PowerDown();
-    std::string remove = "rm -rf '" + root + "'";
-    (void)!std::system(remove.c_str());
     return status;
 }
