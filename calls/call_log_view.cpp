@@ -353,10 +353,4 @@ void CallLogView::DeleteSelected(int log) {
     LoadCallLog(log);
 }
 
-View* CreateCallLogView(QWidget* parent, ShellContext& context) {
-    return new CallLogView(
-        parent, context, nullptr, nullptr,
-        [&context](const std::u16string& number) { return DialFromAnywhere(context, number); });
-}
-
 }  // namespace vqm

@@ -99,7 +99,4 @@ class CallLogView : public View {
     std::array<Menu, kCallLogCount> menus_{};
 };
 
-// The factory of view 5.
-View* CreateCallLogView(QWidget* parent, ShellContext& context);
-
 }  // namespace vqm

@@ -9,6 +9,8 @@
 #include <cstdio>
 #include <cstring>
 
+#include "calls/call_log.h"
+#include "contacts/phonebook_cache.h"
 #include "link/link.h"
 #include "link/ports.h"
 #include "shell/dialogs.h"
@@ -97,8 +99,12 @@ int main(int argc, char** argv) {
     vqm::Dialogs dialogs;
     dialogs.SetLog(&uiLog);
     dialogs.SetAutoAnswer(autoAnswer);
+    vqm::CallLog callLog(settings);
+    vqm::PhonebookCaches caches(settings);
     vqm::ShellContext context{settings, link, dialogs, runtimeRoot};
     context.uiLog = &uiLog;
+    context.callLog = &callLog;
+    context.caches = &caches;
     vqm::MainWindow window(context, vqm::DefaultViewFactories());
 
     // Ctrl-C or a stop from the session ends the dialer as "Exit" does: the call is hung up

@@ -26,6 +26,10 @@ class Dialogs;
 class Notifier;
 class SettingsStore;
 class UiLog;
+struct CallLog;
+struct PhonebookCaches;
+struct CallLog;
+struct PhonebookCaches;
 
 inline constexpr int kViewCount = 7;
 // The DialPad's two status lines (labels), which the card watch writes through ShowStatus.
@@ -43,7 +47,11 @@ struct ShellContext {
     Link& link;
     Dialogs& dialogs;
     std::string runtimeRoot;
-    UiLog* uiLog = nullptr;            // what the window shows, recorded when the program asks
+    UiLog* uiLog = nullptr;  // what the window shows, recorded when the program asks
+    // The call logs and phonebook caches that every view shares: their locks guard only when
+    // all readers and writers go through the same objects. A view given none makes its own.
+    CallLog* callLog = nullptr;
+    PhonebookCaches* caches = nullptr;
     MessageLayer* messages = nullptr;  // set by the main window
     class MainWindow* mainWindow = nullptr;
 };

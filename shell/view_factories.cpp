@@ -8,11 +8,15 @@ namespace vqm {
 std::array<ViewFactory, kViewCount> DefaultViewFactories() {
     std::array<ViewFactory, kViewCount> factories;
     factories[kViewDialPad] = [](QWidget* parent, ShellContext& context) -> View* {
-        return new DialPadView(parent, context);
+        return new DialPadView(parent, context, context.callLog, context.caches);
     };
     for (int i = 1; i < kViewCount; ++i)
         factories[i] = [](QWidget* parent, ShellContext&) { return new View(parent); };
-    factories[kViewCallLog] = CreateCallLogView;
+    factories[kViewCallLog] = [](QWidget* parent, ShellContext& context) -> View* {
+        return new CallLogView(
+            parent, context, context.callLog, context.caches,
+            [&context](const std::u16string& number) { return DialFromAnywhere(context, number); });
+    };
     return factories;
 }
 
