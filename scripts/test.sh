@@ -16,4 +16,6 @@ cmake --build "$build" --parallel "$(nproc)"
 if [ "$sanitize" = thread ]; then
     export TSAN_OPTIONS="suppressions=$top/scripts/tsan.supp ${TSAN_OPTIONS:-}"
 fi
-ctest --test-dir "$build" --output-on-failure --parallel "$(nproc)"
+# Most tests wait on the simulated card's line (a reply ends after 200 ms of silence), so twice
+# as many run at once as there are cores.
+ctest --test-dir "$build" --output-on-failure --parallel "$(( $(nproc) * 2 ))"
