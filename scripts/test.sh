@@ -11,7 +11,10 @@ sanitize=${VQM_SANITIZE:-}
 source "$top/scripts/packages.sh"
 vqm_ensure_packages "${VQM_PACKAGES[@]}"
 
-cmake -S "$top" -B "$build" -G Ninja -DVQM_SANITIZE="$sanitize" >/dev/null
+# Sanitizer builds are for the tests alone: no benchmark programs.
+bench=ON
+[ -n "$sanitize" ] && bench=OFF
+cmake -S "$top" -B "$build" -G Ninja -DVQM_SANITIZE="$sanitize" -DVQM_BUILD_BENCH="$bench" >/dev/null
 cmake --build "$build" --parallel "$(nproc)"
 if [ "$sanitize" = thread ]; then
     export TSAN_OPTIONS="suppressions=$top/scripts/tsan.supp ${TSAN_OPTIONS:-}"
