@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # Builds the libFuzzer targets with clang (address and undefined sanitizers) and runs each for a
-# bounded time: `bash scripts/fuzz.sh` (20 s each, as in CI) or `bash scripts/fuzz.sh 600`.
+# bounded time: `bash scripts/fuzz.sh` (20 s each; CI gives each 10 s) or `bash scripts/fuzz.sh 600`.
 set -euo pipefail
 top=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
 seconds=${1:-20}
