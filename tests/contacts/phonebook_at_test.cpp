@@ -24,6 +24,11 @@
 namespace vqm {
 namespace {
 
+// The final result of a whole reply, read within its own length.
+int FinalOf(const std::string& reply) {
+    return AtFinalResult(reply.c_str(), static_cast<int>(reply.size()));
+}
+
 using testing::FakeCard;
 using testing::TempFolder;
 
@@ -342,9 +347,9 @@ TEST_F(SimulatedPhonebookTest, WriteDeleteAndFirstFreePlace) {
     EXPECT_EQ(Text(Read(12)), "Other");
 
     // Without an index the card takes the lowest free place.
-    EXPECT_EQ(AtFinalResult(Command("AT+CPBW=,\"0456\",129,\"First\"\r").c_str(), 200), 0);
+    EXPECT_EQ(FinalOf(Command("AT+CPBW=,\"0456\",129,\"First\"\r")), 0);
     EXPECT_EQ(Text(Read(1)), "First");
-    EXPECT_EQ(AtFinalResult(Command("AT+CPBW=,\"0789\"\r").c_str(), 200), 0);
+    EXPECT_EQ(FinalOf(Command("AT+CPBW=,\"0789\"\r")), 0);
     EXPECT_EQ(Number(Read(2)), "0789");
 
     EXPECT_EQ(PhonebookDeleteEntry(*link_, "ME", 12), 1);
@@ -368,14 +373,14 @@ TEST_F(SimulatedPhonebookTest, CardRefusesWhatDoesNotFit) {
     EXPECT_EQ(PhonebookWriteEntry(*link_, "SM", MakeEntry(5, "12a4", 129, "x")), 4);
     EXPECT_EQ(PhonebookDeleteEntry(*link_, "SM", h + 1), 0);
     EXPECT_EQ(PhonebookDeleteEntry(*link_, "SM", 0), 0);
-    EXPECT_NE(AtFinalResult(Command("AT+CPBR=0,5\r").c_str(), 200), 0);
-    EXPECT_NE(AtFinalResult(Command("AT+CPBR=5,4\r").c_str(), 200), 0);
-    EXPECT_NE(AtFinalResult(Command("AT+CPBR=1," + std::to_string(h + 1) + "\r").c_str(), 200), 0);
+    EXPECT_NE(FinalOf(Command("AT+CPBR=0,5\r")), 0);
+    EXPECT_NE(FinalOf(Command("AT+CPBR=5,4\r")), 0);
+    EXPECT_NE(FinalOf(Command("AT+CPBR=1," + std::to_string(h + 1) + "\r")), 0);
     EXPECT_EQ(Text(Read(h)), longestName);  // the refused writes left it alone
 
     // A full book has no first free place.
     ASSERT_EQ(sim_->Control("phonebook-fill SM " + std::to_string(h)), "OK");
-    EXPECT_EQ(AtFinalResult(Command("AT+CPBW=,\"0456\",129,\"x\"\r").c_str(), 200), 4);
+    EXPECT_EQ(FinalOf(Command("AT+CPBW=,\"0456\",129,\"x\"\r")), 4);
     EXPECT_EQ(sim_->Control("phonebook-add SM 0456 Late"), "ERROR: phonebook full");
 }
 
