@@ -414,13 +414,7 @@ void DialPad::OnCallKey() {
         }
     } else if (callState_ == kCallRinging) {
         if (AnswerCall(link_) == 0) {
-            char narrow[kCallLogNumberSize];
-            const std::u16string caller = CallerNumber();
-            WideToNarrow(caller.data(), narrow, static_cast<int>(caller.size()), sizeof narrow);
-            AddAnsweredCall(callLog_, narrow);
-            ui_.StopRingTone();
-            SetStatusLine(1, u"Voice call");
-            callState_ = kCallVoice;
+            CallAnswered();
         } else {
             // The ring stops with the failed answer: a tone under "Call ended" would mislead.
             ui_.StopRingTone();
@@ -479,7 +473,11 @@ void DialPad::OnDialResult(int result) {
 
 void DialPad::OnCallActive() {
     if (callState_ != kCallRinging) return;
-    // Answered on the card's own controls.
+    CallAnswered();  // on the card's own controls
+}
+
+// A ringing call answered, by the Call key or on the card: logged, the ring stops, talk starts.
+void DialPad::CallAnswered() {
     char narrow[kCallLogNumberSize];
     const std::u16string caller = CallerNumber();
     WideToNarrow(caller.data(), narrow, static_cast<int>(caller.size()), sizeof narrow);

@@ -167,6 +167,7 @@ class DialPad {
     void OnEndKey();
     void OnDialResult(int result);
     void OnCallActive();
+    void CallAnswered();
     void OnCallListEmpty();
     void OnTimer(int id);
     void OnCardState(int state);
