@@ -1,13 +1,20 @@
 #include "cardsim/card_engine.h"
 
+#include <algorithm>
 #include <cctype>
 #include <cstdlib>
+
+#include "cardsim/arguments.h"
 
 namespace vqm::cardsim {
 
 namespace {
 
 constexpr size_t kMaxLine = 1024;
+
+// +CME ERROR codes of 27.007 the engine answers with on a standard modem.
+constexpr int kNotAllowed = 3;
+constexpr int kUnknownError = 100;
 
 std::string Upper(std::string text) {
     for (char& c : text)
@@ -19,37 +26,76 @@ bool StartsWith(const std::string& text, const std::string& prefix) {
     return text.compare(0, prefix.size(), prefix) == 0;
 }
 
-// The value of "NAME=<n>" commands; false when it is not a whole number.
-bool NumberAfter(const std::string& text, size_t at, int* value) {
-    if (at >= text.size()) return false;
-    char* end = nullptr;
-    long parsed = std::strtol(text.c_str() + at, &end, 10);
-    if (*end != '\0' || end == text.c_str() + at) return false;
-    *value = static_cast<int>(parsed);
+// The value of "NAME=<n>" for a setting of 0 or 1 (2 for +CMEE); false for anything else.
+bool Setting(const std::string& args, int high, int* value) {
+    std::vector<Argument> fields;
+    if (!SplitArguments(args, &fields) || fields.size() != 1 || fields[0].quoted ||
+        fields[0].text.size() != 1 || fields[0].text[0] < '0' || fields[0].text[0] > '0' + high)
+        return false;
+    *value = fields[0].text[0] - '0';
     return true;
 }
 
-// The ';' that ends a chained command; one inside quotes belongs to a name or a text.
-size_t NextSeparator(const std::string& body, size_t from) {
-    bool quoted = false;
-    for (size_t i = from; i < body.size(); ++i) {
-        if (body[i] == '"') quoted = !quoted;
-        if (body[i] == ';' && !quoted) return i;
+// The call's state as an Ericsson-style "*ECAV:" reports it: 0 idle, 1 calling, 3 active,
+// 6 alerting (a call coming in).
+int VendorCallState(CallState state) {
+    switch (state) {
+        case CallState::None:
+            return 0;
+        case CallState::Dialing:
+            return 1;
+        case CallState::Active:
+            return 3;
+        case CallState::Alerting:
+        case CallState::Incoming:
+            return 6;
     }
-    return std::string::npos;
+    return 0;
 }
 
 }  // namespace
+
+CardEngine::CardEngine(EngineConfig config) : config_(std::move(config)) {
+    auto core = std::make_unique<CoreCommands>();
+    core_ = core.get();
+    AddCommandSet(std::move(core));
+}
 
 float CardEngine::FirmwareVersion() const {
     size_t at = config_.firmware.find("SW");
     return at == std::string::npos ? 0.0f : std::strtof(config_.firmware.c_str() + at + 2, nullptr);
 }
 
+std::string CardEngine::MeError(int code) const {
+    if (!Standard() || errorMode_ == 0) return "ERROR";
+    if (errorMode_ == 2) {
+        switch (code) {
+            case 3:
+                return "+CME ERROR: operation not allowed";
+            case 4:
+                return "+CME ERROR: operation not supported";
+            case 50:
+                return "+CME ERROR: Incorrect parameters";
+            case 100:
+                return "+CME ERROR: unknown";
+        }
+    }
+    return "+CME ERROR: " + std::to_string(code);
+}
+
+void CardEngine::InjectUnsolicited(const std::string& text, size_t at) {
+    injection_ = Injection{text, at, 0, true};
+}
+
 void CardEngine::Feed(const char* bytes, size_t length, Clock::time_point now) {
     for (size_t i = 0; i < length; ++i) {
         if (silent_) continue;
         const char c = bytes[i];
+        if (injection_.armed && injection_.seen >= injection_.at) {
+            injection_.armed = false;
+            Unsolicited(injection_.text);
+        }
+        if (injection_.armed) ++injection_.seen;
         if (commandRunning_) {
             // As on a modem, any character while a dial is pending aborts it; the rest of
             // that line is not a command.
@@ -66,11 +112,13 @@ void CardEngine::Feed(const char* bytes, size_t length, Clock::time_point now) {
             if (c == '\r') discardLine_ = false;
             continue;
         }
-        if (echo_) output_.push_back(c);
+        if (echo_ && !Standard()) output_.push_back(c);
         if (c == '\r') {
             std::string line;
             line.swap(input_);
+            const size_t replyStart = output_.size();
             RunLine(line, now);
+            if (injection_.armed) PlaceInjection(replyStart);
         } else if (c != '\n' && input_.size() < kMaxLine) {
             input_.push_back(c);
         }
@@ -81,7 +129,8 @@ void CardEngine::Feed(const char* bytes, size_t length, Clock::time_point now) {
 void CardEngine::RunPromptByte(char c) {
     constexpr char kCtrlZ = 0x1A, kEscape = 0x1B;
     constexpr size_t kMaxPromptText = 4096;
-    if (echo_ && c != kCtrlZ && c != kEscape) output_.push_back(c);
+    if (echo_ && !Standard() && c != kCtrlZ && c != kEscape) output_.push_back(c);
+    const size_t replyStart = output_.size();
     if (c == kCtrlZ) {
         CommandSet* set = prompting_;
         prompting_ = nullptr;
@@ -89,6 +138,7 @@ void CardEngine::RunPromptByte(char c) {
         const bool ok = set->Complete(promptText_, info, errorText);
         promptText_.clear();
         output_ += info;
+        if (!ok && Standard() && errorText == "ERROR") errorText = MeError(kUnknownError);
         Result(ok ? "OK" : errorText);
     } else if (c == kEscape) {
         prompting_ = nullptr;
@@ -96,7 +146,9 @@ void CardEngine::RunPromptByte(char c) {
         Result("OK");
     } else if (promptText_.size() < kMaxPromptText) {
         promptText_.push_back(c);
+        return;
     }
+    if (injection_.armed) PlaceInjection(replyStart);
 }
 
 void CardEngine::Result(const std::string& text) {
@@ -106,9 +158,44 @@ void CardEngine::Result(const std::string& text) {
     pendingUnsolicited_.clear();
 }
 
+// A standard modem's unsolicited line may go where a reply line has ended and the next begins
+// ("...\r\n" followed by "\r\n..."), or at either end of what is not yet taken.
+bool CardEngine::LineBoundary(size_t at, size_t start) const {
+    if (at == start || at >= output_.size()) return true;
+    return at >= 2 && output_[at - 1] == '\n' && output_[at - 2] == '\r' &&
+           output_.compare(at, 2, "\r\n") == 0;
+}
+
 void CardEngine::Unsolicited(const std::string& text) {
     if (silent_) return;
-    (commandRunning_ ? pendingUnsolicited_ : output_) += "\r\n" + text + "\r\n";
+    const std::string line = "\r\n" + text + "\r\n";
+    if (!Standard()) {
+        (commandRunning_ ? pendingUnsolicited_ : output_) += line;
+        return;
+    }
+    // Sent at once: if a reply is still waiting to go out, between its lines, after any
+    // unsolicited line already placed there, so that they keep their order.
+    size_t at = std::max<size_t>(unsolicitedEnd_, 1);
+    while (at < output_.size() && !LineBoundary(at, 0))
+        ++at;
+    at = std::min(at, output_.size());
+    output_.insert(at, line);
+    unsolicitedEnd_ = at + line.size();
+}
+
+void CardEngine::PlaceInjection(size_t replyStart) {
+    injection_.armed = false;
+    const size_t offset = injection_.at - std::min(injection_.at, injection_.seen);
+    size_t at = replyStart + offset;
+    if (!Standard() || at >= output_.size()) {
+        Unsolicited(injection_.text);  // after the reply (the card: after a pending dial too)
+        return;
+    }
+    while (!LineBoundary(at, replyStart))
+        ++at;
+    const std::string line = "\r\n" + injection_.text + "\r\n";
+    output_.insert(at, line);
+    unsolicitedEnd_ = std::max(unsolicitedEnd_, at + line.size());
 }
 
 void CardEngine::RunLine(const std::string& rawLine, Clock::time_point now) {
@@ -124,16 +211,16 @@ void CardEngine::RunLine(const std::string& rawLine, Clock::time_point now) {
     std::string info, errorText = "ERROR";
     bool deferred = false;
     bool ok = true;
+    unknownCommand_ = false;
     if (!body.empty() && std::toupper(static_cast<unsigned char>(body[0])) == 'D') {
         ok = RunCommand(body, info, errorText, deferred, now);  // the dial string holds its ';'
     } else {
         size_t start = 0;
         while (ok && !prompting_ && start <= body.size()) {
-            size_t end = NextSeparator(body, start);
-            std::string part =
-                body.substr(start, end == std::string::npos ? std::string::npos : end - start);
+            const size_t end = CommandEnd(body, start);
+            std::string part = body.substr(start, end - start);
             if (!part.empty() || start == 0) ok = RunCommand(part, info, errorText, deferred, now);
-            if (end == std::string::npos) break;
+            if (end == body.size()) break;
             start = end + 1;
         }
     }
@@ -143,6 +230,10 @@ void CardEngine::RunLine(const std::string& rawLine, Clock::time_point now) {
         output_ += "\r\n> ";
         return;
     }
+    // A standard modem reports a known command's failure as an ME error; one it does not know
+    // stays a plain ERROR, as on any modem.
+    if (!ok && Standard() && errorText == "ERROR" && !unknownCommand_)
+        errorText = MeError(kUnknownError);
     Result(ok ? "OK" : errorText);
 }
 
@@ -151,8 +242,15 @@ bool CardEngine::RunCommand(const std::string& command, std::string& info, std::
     const std::string upper = Upper(command);
     auto line = [&](const std::string& text) { info += "\r\n" + text + "\r\n"; };
     if (upper.empty()) return true;
+    // One reading of parameters for every group: a command whose parameters do not split
+    // (an unclosed quote, text beside a quoted field) is refused before any group sees it.
+    const size_t equals = upper.find('=');
+    if (upper[0] != 'D' && equals != std::string::npos) {
+        std::vector<Argument> fields;
+        if (!SplitArguments(command.substr(equals + 1), &fields)) return false;
+    }
     if (upper == "E0" || upper == "E1") {
-        echo_ = upper == "E1";
+        echo_ = upper == "E1";  // a standard modem takes the setting but never echoes
         return true;
     }
     if (upper == "&F" || upper == "Z") {
@@ -165,53 +263,53 @@ bool CardEngine::RunCommand(const std::string& command, std::string& info, std::
     if (upper == "+CSCS=?") return line("+CSCS: (\"GSM\",\"IRA\",\"8859-1\",\"UCS2\")"), true;
     if (upper == "+CSCS?") return line("+CSCS: \"" + charset_ + "\""), true;
     if (StartsWith(upper, "+CSCS=")) {
-        std::string wanted = upper.substr(6);
-        if (wanted.size() >= 2 && wanted.front() == '"' && wanted.back() == '"')
-            wanted = wanted.substr(1, wanted.size() - 2);
+        std::vector<Argument> fields;
+        SplitArguments(upper.substr(6), &fields);
+        const std::string wanted = fields.size() == 1 ? fields[0].text : std::string();
         if (wanted != "GSM" && wanted != "IRA" && wanted != "8859-1" && wanted != "UCS2")
             return false;
         charset_ = wanted;
         return true;
     }
-    // Clients check that the radio is on; it always is while the card is powered.
-    if (upper == "+CFUN?") return line("+CFUN: 1"), true;
-    if (upper == "+CFUN=1" || upper == "+CFUN=1,0") return true;
-    if (upper == "+CIMI") return line("202015550123456"), true;
+    if (Standard()) {
+        // How a standard modem reports rings, callers and errors.
+        int value = 0;
+        if (upper == "+CRC?") return line("+CRC: " + std::to_string(cellularRing_ ? 1 : 0)), true;
+        if (upper == "+CLIP?")
+            return line("+CLIP: " + std::to_string(callerId_ ? 1 : 0) + ",1"), true;
+        if (upper == "+CMEE?") return line("+CMEE: " + std::to_string(errorMode_)), true;
+        if (StartsWith(upper, "+CRC=")) {
+            if (!Setting(upper.substr(5), 1, &value)) return false;
+            cellularRing_ = value == 1;
+            return true;
+        }
+        if (StartsWith(upper, "+CLIP=")) {
+            if (!Setting(upper.substr(6), 1, &value)) return false;
+            callerId_ = value == 1;
+            return true;
+        }
+        if (StartsWith(upper, "+CMEE=")) {
+            if (!Setting(upper.substr(6), 2, &value)) return false;
+            errorMode_ = value;
+            return true;
+        }
+    }
     for (const char* setting : {"+CLIP=", "+CRC=", "+CNMI=", "+CMEE="})
         if (StartsWith(upper, setting)) return upper.size() > std::string(setting).size();
-    if (upper == "+GMI" || upper == "+CGMI") return line("Tavro Mobile Phones"), true;
-    if (upper == "+GMM" || upper == "+CGMM") return line("TAVRO CARD PHONE 2.0"), true;
-    if (upper == "+GMR" || upper == "+CGMR") return line(config_.firmware), true;
-    if (upper == "+CGSN" || upper == "+GSN") return line("490154203237518"), true;
-    if (upper == "+CSQ") return line("+CSQ: " + std::to_string(config_.signalQuality) + ",0"), true;
-    if (upper == "+COPS?")
-        return line("+COPS: " + std::to_string(config_.selectionMode) + ",2," +
-                    std::to_string(config_.operatorCode)),
-               true;
-    if (upper == "+CLVL?") return line("+CLVL: " + std::to_string(volume_)), true;
-    if (StartsWith(upper, "+CLVL=")) {
-        int level;
-        if (!NumberAfter(upper, 6, &level) || level < 0 || level > 10) return false;
-        SetVolume(level);
-        return true;
-    }
-    if (upper == "+CLCC") {
-        if (state_ != CallState::None) {
-            const bool international = !callNumber_.empty() && callNumber_[0] == '+';
-            line("+CLCC: 1," + std::string(outgoing_ ? "0" : "1") + "," +
-                 std::to_string(static_cast<int>(state_)) + ",0,0,\"" + callNumber_ + "\"," +
-                 (international ? "145" : "129"));
-        }
-        return true;
-    }
     if (StartsWith(upper, "+VTS=")) {
-        if (state_ != CallState::Active || upper.size() != 6) return false;
+        if (state_ != CallState::Active || upper.size() != 6) {
+            errorText = MeError(kNotAllowed);
+            return false;
+        }
         dtmf_.push_back(upper[5]);
         return true;
     }
     if (upper == "A") {
-        if (state_ != CallState::Incoming) return false;
-        state_ = CallState::Active;
+        if (state_ != CallState::Incoming) {
+            errorText = MeError(kNotAllowed);
+            return false;
+        }
+        SetState(CallState::Active);
         return true;
     }
     if (upper == "H" || upper == "H0") {
@@ -219,12 +317,15 @@ bool CardEngine::RunCommand(const std::string& command, std::string& info, std::
         return true;
     }
     if (upper[0] == 'D') {
-        if (state_ != CallState::None) return false;
+        if (state_ != CallState::None) {
+            errorText = MeError(kNotAllowed);
+            return false;
+        }
         std::string number = command.substr(1);
         if (!number.empty() && number.back() == ';') number.pop_back();
         callNumber_ = number;
         outgoing_ = true;
-        state_ = CallState::Dialing;
+        SetState(CallState::Dialing);
         dialDecision_ = now + std::chrono::milliseconds(config_.dialDelayMs);
         commandRunning_ = true;
         deferred = true;
@@ -243,6 +344,7 @@ bool CardEngine::RunCommand(const std::string& command, std::string& info, std::
                 return true;
         }
     }
+    unknownCommand_ = true;
     return false;
 }
 
@@ -261,7 +363,7 @@ void CardEngine::Tick(Clock::time_point now) {
             EndCall();
             Result("NO ANSWER");
         } else {
-            state_ = CallState::Active;
+            SetState(CallState::Active);
             Result("OK");
         }
     }
@@ -269,28 +371,53 @@ void CardEngine::Tick(Clock::time_point now) {
         if (now >= ringGivesUp_) {
             EndCall();
         } else if (now >= nextRing_) {
-            Unsolicited("+CRING: VOICE");
-            const std::string type = !callNumber_.empty() && callNumber_[0] == '+' ? "145" : "129";
-            // Firmware up to 3.81 sends the number bare; later firmware quotes it.
-            const bool quoted = FirmwareVersion() > 3.81f;
-            Unsolicited("+CLIP: " + (quoted ? "\"" + callNumber_ + "\"" : callNumber_) + "," +
-                        type);
+            SendRing();
             nextRing_ = now + std::chrono::milliseconds(config_.ringRepeatMs);
         }
     }
 }
 
+void CardEngine::SendRing() {
+    const bool international = !callNumber_.empty() && callNumber_[0] == '+';
+    const std::string type = international ? "145" : "129";
+    if (Standard()) {
+        // 27.007: RING unless +CRC=1, the caller only after +CLIP=1, the number without its
+        // '+' (the type says it is international) and the CLI validity last.
+        Unsolicited(cellularRing_ ? "+CRING: VOICE" : "RING");
+        if (callerId_)
+            Unsolicited("+CLIP: \"" + callNumber_.substr(international ? 1 : 0) + "\"," + type +
+                        ",,,,0");
+        return;
+    }
+    Unsolicited("+CRING: VOICE");
+    // Firmware up to 3.81 sends the number bare; later firmware quotes it.
+    const bool quoted = FirmwareVersion() > 3.81f;
+    Unsolicited("+CLIP: " + (quoted ? "\"" + callNumber_ + "\"" : callNumber_) + "," + type);
+}
+
 std::string CardEngine::TakeOutput() {
     std::string out;
     out.swap(output_);
+    unsolicitedEnd_ = 0;
+    return out;
+}
+
+std::string CardEngine::TakeOutputLine() {
+    size_t at = 1;
+    while (at < output_.size() && !LineBoundary(at, 0))
+        ++at;
+    at = std::min(at, output_.size());
+    std::string out = output_.substr(0, at);
+    output_.erase(0, at);
+    unsolicitedEnd_ -= std::min(unsolicitedEnd_, at);
     return out;
 }
 
 void CardEngine::Ring(const std::string& number, Clock::time_point now) {
     if (state_ != CallState::None) return;
-    state_ = CallState::Incoming;
     outgoing_ = false;
     callNumber_ = number;
+    SetState(CallState::Incoming);
     nextRing_ = now;
     ringGivesUp_ = now + std::chrono::milliseconds(config_.ringTimeoutMs);
     Tick(now);
@@ -303,7 +430,7 @@ void CardEngine::CallerHangUp() {
 void CardEngine::RemoteAnswer() {
     if (state_ == CallState::Dialing && commandRunning_) {
         commandRunning_ = false;
-        state_ = CallState::Active;
+        SetState(CallState::Active);
         Result("OK");
     }
 }
@@ -320,7 +447,7 @@ void CardEngine::RemoteHangUp() {
 }
 
 void CardEngine::LocalAnswer() {
-    if (state_ == CallState::Incoming) state_ = CallState::Active;
+    if (state_ == CallState::Incoming) SetState(CallState::Active);
 }
 
 void CardEngine::SendGarbage(size_t count) {
@@ -330,8 +457,40 @@ void CardEngine::SendGarbage(size_t count) {
     }
 }
 
+void CardEngine::SetSignal(int quality) {
+    const bool changed = quality != config_.signalQuality;
+    ChangeConfig().signalQuality = quality;
+    // ^RSSI counts 0..31 as +CSQ does, 99 unknown.
+    if (changed && Standard()) Unsolicited("^RSSI: " + std::to_string(quality));
+}
+
+void CardEngine::SetOperator(int code) {
+    const bool changed = code != config_.operatorCode;
+    ChangeConfig().operatorCode = code;
+    if (changed && Standard()) Unsolicited("+CREG: 1");
+}
+
+void CardEngine::PowerLost() {
+    EndCall();
+    commandRunning_ = discardLine_ = false;
+    prompting_ = nullptr;
+    promptText_.clear();
+    input_.clear();
+    output_.clear();
+    pendingUnsolicited_.clear();
+    unsolicitedEnd_ = 0;
+    injection_.armed = false;
+}
+
+void CardEngine::SetState(CallState state) {
+    if (state == state_) return;
+    state_ = state;
+    // A standard modem's vendor report of every change of a call, which the dialer must ignore.
+    if (Standard()) Unsolicited("*ECAV: 1," + std::to_string(VendorCallState(state)) + ",1");
+}
+
 void CardEngine::EndCall() {
-    state_ = CallState::None;
+    SetState(CallState::None);
     callNumber_.clear();
     outgoing_ = false;
 }

@@ -73,6 +73,8 @@ void CardSim::PowerDown() {
     stop_ = true;
     if (worker_.joinable()) worker_.join();
     std::lock_guard<std::mutex> lock(mutex_);
+    // A card without power has no call: it does not come back when the card does.
+    engine_.PowerLost();
     if (master_ >= 0) close(master_);
     master_ = -1;
     slavePath_.clear();
@@ -117,7 +119,12 @@ void CardSim::Run() {
             const auto now = Clock::now();
             if (n > 0) engine_.Feed(buffer, static_cast<size_t>(n), now);
             engine_.Tick(now);
-            pending += engine_.TakeOutput();
+            // A standard modem lets unsolicited lines in between the lines of a reply, so it
+            // hands its output over one line at a time, as the line takes it.
+            if (!engine_.Standard())
+                pending += engine_.TakeOutput();
+            else if (pending.empty())
+                pending = engine_.TakeOutputLine();
             if (engine_.Revision() != savedRevision_) SaveState();
         }
         while (!pending.empty() && !stop_) {
@@ -155,6 +162,7 @@ std::string CardSim::Control(const std::string& line) {
         if (command == "status") return "OK " + Status();
         std::string result;
         const std::string rest = AfterFirstWord(line);
+        if (command == "unsolicited" || command == "inject") return ControlLine(command, rest);
         for (const auto& set : engine_.CommandSets()) {
             result = set->Control(command, rest);
             if (!result.empty()) break;
@@ -188,6 +196,7 @@ std::string CardSim::ControlEngine(const std::string& command, const std::string
         if (command == "unanswered") engine_.SetUnanswered(argument);
         if (command == "reachable") engine_.SetReachable(argument);
     } else if (command == "signal" || command == "operator") {
+        // Through the engine, so that a standard modem reports the change.
         char* end = nullptr;
         long value = std::strtol(argument.c_str(), &end, 10);
         if (argument.empty() || *end != '\0') return needs("a number");
@@ -195,8 +204,10 @@ std::string CardSim::ControlEngine(const std::string& command, const std::string
             return needs("a quality from 0 to 31, or 99");
         if (command == "operator" && (value < 100 || value > 999999))
             return needs("a network code such as 20201");
-        (command == "signal" ? engine_.ChangeConfig().signalQuality
-                             : engine_.ChangeConfig().operatorCode) = static_cast<int>(value);
+        if (command == "signal")
+            engine_.SetSignal(static_cast<int>(value));
+        else
+            engine_.SetOperator(static_cast<int>(value));
     } else if (command == "firmware") {
         if (argument.empty()) return needs("a version such as SW3.80");
         engine_.ChangeConfig().firmware = argument.rfind("SW", 0) == 0 ? argument : "SW" + argument;
@@ -213,6 +224,27 @@ std::string CardSim::ControlEngine(const std::string& command, const std::string
     return "OK";
 }
 
+// "unsolicited TEXT" sends a line now; "inject N TEXT" at byte N of the next exchange.
+std::string CardSim::ControlLine(const std::string& command, const std::string& rest) {
+    std::string text = rest;
+    size_t at = 0;
+    if (command == "inject") {
+        char* end = nullptr;
+        const long position = std::strtol(rest.c_str(), &end, 10);
+        if (rest.empty() || end == rest.c_str() || position < 0 || position > 65536 ||
+            (*end != ' ' && *end != '\t'))
+            return "ERROR: inject needs a byte position and a line";
+        at = static_cast<size_t>(position);
+        text = AfterFirstWord(rest);
+    }
+    if (text.empty()) return "ERROR: " + command + " needs a line";
+    if (command == "inject")
+        engine_.InjectUnsolicited(text, at);
+    else
+        engine_.Unsolicited(text);
+    return "OK";
+}
+
 std::string CardSim::Status() const {
     static const char* const kStates[] = {"active", "held", "dialing", "alerting", "incoming"};
     const int state = static_cast<int>(engine_.State());
@@ -222,8 +254,9 @@ std::string CardSim::Status() const {
         << " call=" << (state < 0 ? "none" : kStates[state]);
     if (!engine_.CallNumber().empty()) out << " number=" << engine_.CallNumber();
     out << " signal=" << config.signalQuality << " operator=" << config.operatorCode
-        << " firmware=" << config.firmware << " volume=" << engine_.Volume()
-        << " device=" << (slavePath_.empty() ? "-" : slavePath_);
+        << " firmware=" << config.firmware << " volume=" << engine_.Core().Volume()
+        << " device=" << (slavePath_.empty() ? "-" : slavePath_)
+        << " dialect=" << (engine_.Standard() ? "standard" : "card");
     return out.str();
 }
 
@@ -283,8 +316,6 @@ void CardSim::LoadState() {
         if (name == "firmware") config.firmware = value;
         if (name == "signal") config.signalQuality = static_cast<int>(number);
         if (name == "operator") config.operatorCode = static_cast<int>(number);
-        if (name == "volume" && number >= 0 && number <= 10)
-            engine_.SetVolume(static_cast<int>(number));
         if (name == "busy") engine_.SetBusy(value);
         if (name == "unanswered") engine_.SetUnanswered(value);
     }
@@ -297,8 +328,7 @@ void CardSim::SaveState() {
     const EngineConfig& config = engine_.Config();
     std::ostringstream out;
     out << "inserted " << (inserted_ ? 1 : 0) << "\nfirmware " << config.firmware << "\nsignal "
-        << config.signalQuality << "\noperator " << config.operatorCode << "\nvolume "
-        << engine_.Volume() << "\n";
+        << config.signalQuality << "\noperator " << config.operatorCode << "\n";
     for (const std::string& number : engine_.Busy())
         out << "busy " << number << "\n";
     for (const std::string& number : engine_.Unanswered())

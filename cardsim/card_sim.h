@@ -26,9 +26,15 @@ inline constexpr char kControlHelp[] =
     "  firmware VERSION         e.g. SW3.80 (caller number unquoted) or SW4.00\n"
     "  silent on|off            the card stops answering, or answers again\n"
     "  garbage N                N random bytes on the line\n"
-    "  pull | insert            take the card out (it powers down) or put it back\n"
+    "  unsolicited TEXT         the line TEXT from the card now (e.g. \"^RSSI: 3\")\n"
+    "  inject N TEXT            the line TEXT at byte N of the next exchange: the next\n"
+    "                           command as typed, then its reply (standard dialect: moved\n"
+    "                           on to the end of a reply line; card: after the reply)\n"
+    "  pull | insert            take the card out (it powers down, its call dropped) or\n"
+    "                           put it back\n"
     "  power-up | power-down    as the card manager does\n"
-    "  status                   one line: power, call, signal, operator, firmware, device\n";
+    "  status                   one line: power, call, signal, operator, firmware, volume,\n"
+    "                           device, dialect\n";
 
 struct SimConfig {
     int baud = 19200;        // output paced at 10 bits a byte; 0 sends at once
@@ -68,6 +74,7 @@ class CardSim {
     void Register();
     void Unregister();
     std::string ControlEngine(const std::string& command, const std::string& argument);
+    std::string ControlLine(const std::string& command, const std::string& rest);
     std::string Status() const;
     void LoadState();
     void SaveState();  // with mutex_ held

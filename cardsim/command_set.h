@@ -1,5 +1,5 @@
-// A group of AT commands the simulated card answers beyond its core (calls, identity, signal):
-// the message memory, the phonebooks, the network services. Each group keeps its own memory,
+// A group of AT commands the simulated card answers: its core queries (identity, signal,
+// operator, volume, call list), the message memory, the phonebooks, the network services. Each group keeps its own memory,
 // its own network-side control commands and its own lines of the card's kept state, so that
 // the engine stays small and each group can be read and tested on its own.
 #pragma once
@@ -65,7 +65,8 @@ class CommandSet {
     CardEngine* engine_ = nullptr;
 };
 
-// The groups every simulated card has, in the order the engine asks them.
+// The groups every simulated card has beyond the core group (which every engine makes for
+// itself), in the order the engine asks them.
 std::vector<std::unique_ptr<CommandSet>> StandardCommandSets();
 
 }  // namespace vqm::cardsim

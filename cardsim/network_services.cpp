@@ -5,6 +5,7 @@
 #include <ostream>
 #include <sstream>
 
+#include "cardsim/arguments.h"
 #include "cardsim/card_engine.h"
 
 namespace vqm::cardsim {
@@ -21,11 +22,7 @@ constexpr int kNotSupported = 4;
 constexpr int kWrongPassword = 16;
 constexpr int kNoNetwork = 30;
 
-struct Field {
-    std::string text;
-    bool quoted = false;
-    bool Empty() const { return text.empty() && !quoted; }
-};
+using Field = Argument;
 
 std::string Upper(std::string text) {
     for (char& c : text)
@@ -37,21 +34,11 @@ bool StartsWith(const std::string& text, const char* prefix) {
     return text.rfind(prefix, 0) == 0;
 }
 
-// The parameters of an extended command, split at commas outside quotes; quotes are dropped and
-// blanks around unquoted values trimmed.
+// The engine refuses a command whose parameters do not split, so a failed split (no fields)
+// never gets here; it would read as missing parameters anyway.
 std::vector<Field> SplitFields(const std::string& args) {
-    std::vector<Field> fields(1);
-    bool inQuotes = false;
-    for (char c : args) {
-        if (c == '"') {
-            inQuotes = !inQuotes;
-            fields.back().quoted = true;
-        } else if (c == ',' && !inQuotes) {
-            fields.emplace_back();
-        } else if (inQuotes || (c != ' ' && c != '\t')) {
-            fields.back().text.push_back(c);
-        }
-    }
+    std::vector<Field> fields;
+    SplitArguments(args, &fields);
     return fields;
 }
 

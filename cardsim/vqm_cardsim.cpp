@@ -31,6 +31,15 @@ constexpr char kUsage[] =
     "  --power-up-ms N       how long a power-up takes (default 3000)\n"
     "  --baud N              line rate of the card's output (default 19200, 0 unpaced)\n"
     "  --firmware VERSION    SW4.00 (default) or e.g. SW3.80\n"
+    "  --dialect card|standard\n"
+    "                        card (default): the card's own dialect. standard: a plain\n"
+    "                        27.007 modem: no echo whatever ATE says, +GMR \"REV1\",\n"
+    "                        +COPS? with the long name until AT+COPS=3,2 (then the quoted\n"
+    "                        code), +CLIP: \"<digits>\",145,,,,0, RING or +CRING as +CRC\n"
+    "                        says, +CME ERROR: <n> (+CMEE=1 from the start), *ECAV: after\n"
+    "                        every change of a call, ^RSSI:/+CREG: when signal or network\n"
+    "                        change, and unsolicited lines sent at once, even while a\n"
+    "                        command is typed or between the lines of a reply\n"
     "  --dial-delay-ms N     time until the far end decides on a call (default 2000)\n"
     "  --script FILE         run control commands from FILE (\"wait MS\" pauses, # comments)\n"
     "  --state-dir DIR       where the card keeps its state between runs\n"
@@ -104,6 +113,12 @@ int main(int argc, char** argv) {
             scriptPath = argv[++i];
         } else if (option == "--firmware" && hasValue) {
             firmware = argv[++i];
+        } else if (option == "--dialect" && hasValue &&
+                   (std::strcmp(argv[i + 1], "card") == 0 ||
+                    std::strcmp(argv[i + 1], "standard") == 0)) {
+            config.engine.dialect = std::strcmp(argv[++i], "standard") == 0
+                                        ? vqm::cardsim::Dialect::Standard
+                                        : vqm::cardsim::Dialect::Card;
         } else if (option == "--baud" && hasValue && ParseNumber(argv[i + 1], &config.baud)) {
             ++i;
         } else if (option == "--power-up-ms" && hasValue && ParseNumber(argv[i + 1], &powerUpMs)) {
