@@ -1,7 +1,7 @@
 #include "settings/at_common.h"
 
 #include "link/link.h"
-#include "support/text.h"
+#include "support/field_cursor.h"
 
 namespace vqm::settings_detail {
 
@@ -11,21 +11,15 @@ int CommandResult(Link& link, const char* command) {
     return length == 0 ? -1 : AtFinalResult(reply, length);
 }
 
-const char* ScanInt(const char* p, const char* end, int32_t* value) {
-    if (!p || !end) return nullptr;
-    while (p < end && (*p == ' ' || *p == '\t' || *p == '\r' || *p == '\n'))
-        ++p;
-    return ParseInt(p, end, value);
+int ScanInt(FieldCursor& cursor, int32_t* value) {
+    cursor.SkipSpace();
+    return cursor.NextInt(value);
 }
 
-int ScanStatusAndClass(const char* reply, int length, int tagAt, int tagLength, int32_t* status,
-                       int32_t* serviceClass) {
-    if (!reply || tagAt < 0 || tagLength < 0 || tagAt + tagLength > length) return 0;
-    const char* end = reply + length;
-    const char* p = ScanInt(reply + tagAt + tagLength, end, status);
-    if (!p) return 0;
-    if (p >= end || *p != ',') return 1;
-    return ScanInt(p + 1, end, serviceClass) ? 2 : 1;
+int ScanStatusAndClass(FieldCursor& cursor, int32_t* status, int32_t* serviceClass) {
+    if (!ScanInt(cursor, status)) return 0;
+    if (!cursor.Comma()) return 1;
+    return ScanInt(cursor, serviceClass) ? 2 : 1;
 }
 
 }  // namespace vqm::settings_detail

@@ -5,6 +5,7 @@
 
 #include "link/link.h"
 #include "settings/at_common.h"
+#include "support/field_cursor.h"
 #include "support/numbers.h"
 #include "support/text.h"
 
@@ -18,7 +19,6 @@ constexpr char kFacilities[kBarringFacilityCount][3] = {"AO", "OI", "OX", "AI",
                                                         "IR", "AB", "AG", "AC"};
 constexpr int kAllBarrings = 5;
 constexpr char kClckTag[] = "+CLCK:";
-constexpr int kClckTagLength = 6;
 constexpr size_t kPasswordSize = 32;
 
 int SendLockCommand(Link& link, int facility, int mode, const char16_t* password,
@@ -39,11 +39,10 @@ const char* BarringFacility(int facility) {
 
 int ParseBarringReply(const char* reply, int length, int serviceClass) {
     if (!reply || length <= 0) return -1;
-    const int at = FindPattern(0, kClckTag, kClckTagLength, reply, length);
-    if (at < 0) return AtFinalResult(reply, length);
+    FieldCursor cursor(reply, length);
+    if (!cursor.SeekPast(kClckTag)) return AtFinalResult(reply, length);
     int32_t status = 0, reportedClass = 0;
-    const int fields = settings_detail::ScanStatusAndClass(reply, length, at, kClckTagLength,
-                                                           &status, &reportedClass);
+    const int fields = settings_detail::ScanStatusAndClass(cursor, &status, &reportedClass);
     if (fields == 0) return -1;
     if (status == 0) return 0;
     if (fields == 1) return 1;  // a lock that is not kept per class bars every class

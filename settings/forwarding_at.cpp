@@ -6,6 +6,7 @@
 
 #include "link/link.h"
 #include "settings/at_common.h"
+#include "support/field_cursor.h"
 #include "support/numbers.h"
 #include "support/text.h"
 
@@ -16,7 +17,6 @@ using settings_detail::CommandResult;
 namespace {
 
 constexpr char kCcfcTag[] = "+CCFC:";
-constexpr int kCcfcTagLength = 6;
 
 bool ValidPair(int serviceClass, int reason) {
     return serviceClass >= 1 && serviceClass <= 4 && reason >= 0 && reason <= 3;
@@ -25,19 +25,17 @@ bool ValidPair(int serviceClass, int reason) {
 }  // namespace
 
 int ParseForwardReply(const char* reply, int length, char16_t* number, size_t numberSize) {
-    if (!reply || length <= 0) return -1;
-    const int at = FindPattern(0, kCcfcTag, kCcfcTagLength, reply, length);
-    if (at < 0) return -1;
+    FieldCursor cursor(reply, length);
+    if (!cursor.SeekPast(kCcfcTag)) return -1;
+    const FieldCursor afterTag = cursor;
     int32_t status = 0, reportedClass = 0;
-    if (settings_detail::ScanStatusAndClass(reply, length, at, kCcfcTagLength, &status,
-                                            &reportedClass) == 0)
-        return -1;
+    if (settings_detail::ScanStatusAndClass(cursor, &status, &reportedClass) == 0) return -1;
     if (status != 1) return 0;
     // The number is the first quoted field from the tag on, whatever the class field held.
+    FieldCursor numberField = afterTag;
     char narrow[64];
     int narrowLength = 0;
-    if (!ParseQuoted(reply + at + 5, reply + length, narrow, sizeof narrow, &narrowLength))
-        narrowLength = 0;
+    numberField.SeekQuoted(narrow, sizeof narrow, &narrowLength);
     if (number && numberSize > 0) NarrowToWide(narrow, number, narrowLength, numberSize);
     return 1;
 }

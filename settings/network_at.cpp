@@ -7,6 +7,7 @@
 #include "link/link.h"
 #include "link/operators.h"
 #include "settings/at_common.h"
+#include "support/field_cursor.h"
 #include "support/numbers.h"
 #include "support/text.h"
 
@@ -30,11 +31,9 @@ int CurrentOperatorName(Link& link, char16_t* name, size_t nameSize) {
 }
 
 int ParseNetworkMode(const char* reply, int length) {
-    if (!reply || length <= 0) return -1;
-    const int at = FindPattern(0, kCopsTag, kCopsTagLength, reply, length);
-    if (at < 0) return -1;
+    FieldCursor cursor(reply, length);
     int32_t mode = -1;
-    if (!ScanInt(reply + at + kCopsTagLength, reply + length, &mode)) return -1;
+    if (!cursor.SeekPast(kCopsTag) || !ScanInt(cursor, &mode)) return -1;
     return mode;
 }
 
@@ -70,10 +69,10 @@ int ParseOperatorSearch(const char* reply, int length, OperatorName* names, int 
     char work[kOperatorNameSize] = "";
     int found = 0;
     for (int pos = at + 7; pos < length && found < maxNames && names; pos += 10) {
+        // Each entry stands at a fixed stride from the tag, as the card lays its list out.
+        FieldCursor entry(reply + pos, end);
         int32_t status = 0, code = 0;
-        const char* p = ScanInt(reply + pos, end, &status);
-        if (!p || end - p < 3 || std::memcmp(p, ",,,", 3) != 0) break;
-        if (!ScanInt(p + 3, end, &code)) break;
+        if (!ScanInt(entry, &status) || !entry.Literal(",,,") || !ScanInt(entry, &code)) break;
         (void)status;  // forbidden and current networks are listed like the others
         if (code < 0 || OperatorNameByCode(static_cast<uint32_t>(code), work, sizeof work) == 0) {
             if (work[0] == '\0') std::snprintf(work, sizeof work, "%d", static_cast<int>(code));

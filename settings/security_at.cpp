@@ -5,6 +5,7 @@
 
 #include "link/link.h"
 #include "settings/at_common.h"
+#include "support/field_cursor.h"
 #include "support/numbers.h"
 #include "support/text.h"
 
@@ -16,7 +17,6 @@ namespace {
 
 constexpr char kFacilities[kSecurityCodeCount][3] = {"SC", "P2", "PS", "AB"};
 constexpr char kClckTag[] = "+CLCK:";
-constexpr int kClckTagLength = 6;
 constexpr size_t kCodeSize = 32;
 
 }  // namespace
@@ -27,10 +27,10 @@ const char* SecurityFacility(int index) {
 
 int ParseLockReply(const char* reply, int length) {
     if (!reply || length <= 0) return -1;
-    const int at = FindPattern(0, kClckTag, kClckTagLength, reply, length);
-    if (at < 0) return AtFinalResult(reply, length);
+    FieldCursor cursor(reply, length);
+    if (!cursor.SeekPast(kClckTag)) return AtFinalResult(reply, length);
     int32_t status = 0;
-    if (!settings_detail::ScanInt(reply + at + kClckTagLength, reply + length, &status)) return -1;
+    if (!settings_detail::ScanInt(cursor, &status)) return -1;
     return status;
 }
 
