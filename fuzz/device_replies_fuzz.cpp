@@ -27,9 +27,15 @@ void WalkCursor(const char* text, int length, uint8_t selector) {
         int copied = -1;
         const char pick = text[(before - text + step) % length];
         switch (static_cast<unsigned char>(pick) % 10) {
-            case 0: cursor.NextTag("+CLCC:"); break;
-            case 1: cursor.SeekPast(","); break;
-            case 2: cursor.NextInt(&value); break;
+            case 0:
+                cursor.NextTag("+CLCC:");
+                break;
+            case 1:
+                cursor.SeekPast(",");
+                break;
+            case 2:
+                cursor.NextInt(&value);
+                break;
             case 3:
                 if (cursor.NextQuoted(out.data(), out.size(), &copied)) CheckText(out, copied);
                 break;
@@ -39,10 +45,18 @@ void WalkCursor(const char* text, int length, uint8_t selector) {
             case 5:
                 if (cursor.NextNumber(out.data(), out.size(), &copied)) CheckText(out, copied);
                 break;
-            case 6: cursor.SkipField(); break;
-            case 7: cursor.Comma(); break;
-            case 8: cursor.NextLine(); break;
-            default: cursor.SkipSpace(); break;
+            case 6:
+                cursor.SkipField();
+                break;
+            case 7:
+                cursor.Comma();
+                break;
+            case 8:
+                cursor.NextLine();
+                break;
+            default:
+                cursor.SkipSpace();
+                break;
         }
         if (cursor.Position() < before || cursor.Position() > cursor.End()) __builtin_trap();
     }

@@ -83,14 +83,25 @@ struct NumberRow {
 TEST(DeviceReplies, SignalBarsKeepTheCardsMapping) {
     auto csq = [](const std::string& q) { return Ok("+CSQ: " + q + ",0"); };
     const NumberRow rows[] = {
-        {kCard, csq("99"), 4},  {kCard, csq("31"), 4}, {kCard, csq("30"), 3}, {kCard, csq("24"), 3},
-        {kCard, csq("23"), 2},  {kCard, csq("16"), 2}, {kCard, csq("15"), 1}, {kCard, csq("8"), 1},
-        {kCard, csq("7"), 0},   {kCard, csq("0"), 0},  {kCard, Ok(), 0},
+        {kCard, csq("99"), 4},
+        {kCard, csq("31"), 4},
+        {kCard, csq("30"), 3},
+        {kCard, csq("24"), 3},
+        {kCard, csq("23"), 2},
+        {kCard, csq("16"), 2},
+        {kCard, csq("15"), 1},
+        {kCard, csq("8"), 1},
+        {kCard, csq("7"), 0},
+        {kCard, csq("0"), 0},
+        {kCard, Ok(), 0},
         {kStandard, Ok("+CSQ: 18,99"), 2},
         // The card's reading wants the blank after the tag; without it nothing is read.
         {kStandard, Ok("+CSQ:18,99"), 0},
-        {kDamaged, csq("-4"), 0},  {kDamaged, csq("99999999999"), 4}, {kDamaged, Ok("+CSQ: "), 0},
-        {kDamaged, "\r\nERROR\r\n", 0}, {kDamaged, "", 0},
+        {kDamaged, csq("-4"), 0},
+        {kDamaged, csq("99999999999"), 4},
+        {kDamaged, Ok("+CSQ: "), 0},
+        {kDamaged, "\r\nERROR\r\n", 0},
+        {kDamaged, "", 0},
     };
     for (const NumberRow& row : rows) {
         const Bytes reply(row.reply);
@@ -101,11 +112,15 @@ TEST(DeviceReplies, SignalBarsKeepTheCardsMapping) {
 
 TEST(DeviceReplies, SpeakerVolume) {
     const NumberRow rows[] = {
-        {kCard, Ok("+CLVL: 7"), 7},     {kCard, Ok("+CLVL: 0"), 0},
-        {kCard, Ok("+CLVL: 10"), 10},   {kStandard, Ok("+CLVL:3"), 3},
+        {kCard, Ok("+CLVL: 7"), 7},
+        {kCard, Ok("+CLVL: 0"), 0},
+        {kCard, Ok("+CLVL: 10"), 10},
+        {kStandard, Ok("+CLVL:3"), 3},
         {kStandard, "\r\n+CME ERROR: 4\r\n", -1},
-        {kDamaged, Ok("+CLVL: x"), -1}, {kDamaged, Ok(), -1},
-        {kDamaged, "\r\n+CLVL:", -1},   {kDamaged, "", -1},
+        {kDamaged, Ok("+CLVL: x"), -1},
+        {kDamaged, Ok(), -1},
+        {kDamaged, "\r\n+CLVL:", -1},
+        {kDamaged, "", -1},
     };
     for (const NumberRow& row : rows) {
         const Bytes reply(row.reply);
@@ -124,7 +139,7 @@ TEST(DeviceReplies, OperatorInEveryFormat) {
     const TextRow rows[] = {
         {kCard, Ok("+COPS: 0,2,20205"), "PANAFON"},
         {kCard, Ok("+COPS: 1,2,23415"), "VODAFONE"},
-        {kCard, Ok("+COPS: 0,2,99999"), ""},  // not in the table
+        {kCard, Ok("+COPS: 0,2,99999"), ""},    // not in the table
         {kCard, ",2,20205\r\n\r\nOK\r\n", ""},  // the card's form is never read at offset 0
         {kStandard, Ok("+COPS: 0,2,\"23415\""), "VODAFONE"},
         {kStandard, Ok("+COPS: 0,2,\"20205\",7"), "PANAFON"},
@@ -254,8 +269,8 @@ TEST(DeviceReplies, CallerIdByFirmwareAndQuoting) {
     for (const CallerIdRow& row : rows) {
         const Bytes line(row.line);
         char number[32] = "stale";
-        const int n = ParseCallerIdLine(line.text(), line.length(), row.firmware, number,
-                                        sizeof number);
+        const int n =
+            ParseCallerIdLine(line.text(), line.length(), row.firmware, number, sizeof number);
         EXPECT_EQ(std::string(number), row.number)
             << SourceName(row.source) << " " << row.firmware << " " << row.line;
         EXPECT_EQ(n, static_cast<int>(std::strlen(row.number)));
