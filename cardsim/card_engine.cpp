@@ -175,7 +175,8 @@ void CardEngine::Unsolicited(const std::string& text) {
     }
     // Sent at once: if a reply is still waiting to go out, between its lines, after any
     // unsolicited line already placed there, so that they keep their order.
-    size_t at = std::max<size_t>(unsolicitedEnd_, 1);
+    // Where a reply was already partly handed out, its rest begins at a line boundary.
+    size_t at = std::max<size_t>(unsolicitedEnd_, partlyTaken_ ? 0 : 1);
     while (at < output_.size() && !LineBoundary(at, 0))
         ++at;
     at = std::min(at, output_.size());
@@ -187,10 +188,11 @@ void CardEngine::PlaceInjection(size_t replyStart) {
     injection_.armed = false;
     const size_t offset = injection_.at - std::min(injection_.at, injection_.seen);
     size_t at = replyStart + offset;
-    if (!Standard() || at >= output_.size()) {
-        Unsolicited(injection_.text);  // after the reply (the card: after a pending dial too)
+    if (!Standard()) {
+        Unsolicited(injection_.text);  // after the reply, and after a pending dial's result
         return;
     }
+    at = std::min(at, output_.size());
     while (!LineBoundary(at, replyStart))
         ++at;
     const std::string line = "\r\n" + injection_.text + "\r\n";
@@ -399,6 +401,7 @@ std::string CardEngine::TakeOutput() {
     std::string out;
     out.swap(output_);
     unsolicitedEnd_ = 0;
+    partlyTaken_ = false;
     return out;
 }
 
@@ -410,6 +413,7 @@ std::string CardEngine::TakeOutputLine() {
     std::string out = output_.substr(0, at);
     output_.erase(0, at);
     unsolicitedEnd_ -= std::min(unsolicitedEnd_, at);
+    partlyTaken_ = !output_.empty();
     return out;
 }
 
@@ -479,6 +483,7 @@ void CardEngine::PowerLost() {
     output_.clear();
     pendingUnsolicited_.clear();
     unsolicitedEnd_ = 0;
+    partlyTaken_ = false;
     injection_.armed = false;
 }
 

@@ -82,6 +82,7 @@ class CardEngine {
     // modem on the line hands out one line at a time, so that unsolicited lines raised
     // meanwhile go between the lines of a reply.
     std::string TakeOutputLine();
+    bool HasOutput() const { return !output_.empty(); }
 
     // The network side.
     void Ring(const std::string& number, Clock::time_point now);
@@ -164,6 +165,7 @@ class CardEngine {
     bool callerId_ = false;
     int errorMode_ = 1;
     size_t unsolicitedEnd_ = 0;  // standard: the end of the last unsolicited line in output_
+    bool partlyTaken_ = false;   // standard: TakeOutputLine left the rest of a reply
     struct Injection {
         std::string text;
         size_t at = 0;

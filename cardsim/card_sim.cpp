@@ -102,6 +102,7 @@ void CardSim::Run() {
                               : std::chrono::nanoseconds(0);
     auto lineFree = Clock::now();
     std::string pending;
+    bool more = false;  // the engine holds output not yet taken
     while (!stop_) {
         int fd;
         {
@@ -111,7 +112,7 @@ void CardSim::Run() {
         if (fd < 0) return;
         pollfd p{fd, POLLIN, 0};
         // Wake often enough for the engine's timers and to keep sending at the line rate.
-        int ready = poll(&p, 1, pending.empty() ? 5 : 0);
+        int ready = poll(&p, 1, pending.empty() && !more ? 5 : 0);
         char buffer[256];
         ssize_t n = ready > 0 && (p.revents & POLLIN) ? read(fd, buffer, sizeof buffer) : 0;
         {
@@ -125,6 +126,7 @@ void CardSim::Run() {
                 pending += engine_.TakeOutput();
             else if (pending.empty())
                 pending = engine_.TakeOutputLine();
+            more = engine_.HasOutput();
             if (engine_.Revision() != savedRevision_) SaveState();
         }
         while (!pending.empty() && !stop_) {

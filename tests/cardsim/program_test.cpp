@@ -1,4 +1,9 @@
 // vqm-cardsim run as a user runs it: a separate process, its sockets, its control client.
+#include <fcntl.h>
+#include <poll.h>
+#include <termios.h>
+#include <unistd.h>
+
 #include <gtest/gtest.h>
 
 #include <chrono>
@@ -45,6 +50,9 @@ TEST_F(ProgramTest, HelpAndBadOptions) {
     EXPECT_NE(help.find("--power-up-ms"), std::string::npos);
     EXPECT_NE(help.find("remote-hangup"), std::string::npos);
     EXPECT_EQ(RunShell(std::string(VQM_CARDSIM) + " --baud fast").second, 2);
+    EXPECT_EQ(RunShell(std::string(VQM_CARDSIM) + " --dialect hayes").second, 2);
+    EXPECT_NE(help.find("--dialect card|standard"), std::string::npos);
+    EXPECT_NE(help.find("inject N TEXT"), std::string::npos);
     EXPECT_EQ(RunShell(std::string(VQM_CARDSIM) + " --script /nonexistent").second, 2);
     auto [noCard, ctlStatus] = Ctl("status");
     EXPECT_EQ(ctlStatus, 2);
@@ -84,6 +92,47 @@ TEST_F(ProgramTest, TheDialerPowersItUpThroughTheCardManagerAndTalksToIt) {
     EXPECT_FALSE(fs::exists(ControlPath()));
     EXPECT_FALSE(fs::exists(CompanionPath()));
     EXPECT_FALSE(fs::exists(run_ + "/Drivers/Active/vqm-cardsim"));
+}
+
+// The standard personality on its pseudo-terminal, spoken to byte by byte as a raw client would,
+// with an unsolicited line injected between the lines of a reply.
+TEST_F(ProgramTest, TheStandardPersonalityOnTheLine) {
+    Start("--powered --dialect standard");
+    std::string status = Ctl("status").first;
+    ASSERT_NE(status.find("dialect=standard"), std::string::npos) << status;
+    const size_t deviceAt = status.find("device=") + 7;
+    const std::string device = status.substr(deviceAt, status.find(' ', deviceAt) - deviceAt);
+    const int fd = open(device.c_str(), O_RDWR | O_NOCTTY | O_CLOEXEC);
+    ASSERT_GE(fd, 0) << device;
+    termios raw{};
+    tcgetattr(fd, &raw);
+    cfmakeraw(&raw);
+    tcsetattr(fd, TCSANOW, &raw);
+    // Everything up to and including the final "OK" line, within two seconds.
+    auto exchange = [&](const std::string& command) {
+        EXPECT_EQ(write(fd, command.data(), command.size()), static_cast<ssize_t>(command.size()));
+        std::string got;
+        const auto until = std::chrono::steady_clock::now() + 2s;
+        while (got.find("\r\nOK\r\n") == std::string::npos &&
+               std::chrono::steady_clock::now() < until) {
+            pollfd p{fd, POLLIN, 0};
+            char buffer[256];
+            if (poll(&p, 1, 50) > 0) {
+                const ssize_t n = read(fd, buffer, sizeof buffer);
+                if (n > 0) got.append(buffer, static_cast<size_t>(n));
+            }
+        }
+        return got;
+    };
+    EXPECT_EQ(exchange("ATE1\r"), "\r\nOK\r\n");
+    EXPECT_EQ(exchange("AT+GMR\r"), "\r\nREV1\r\n\r\nOK\r\n");
+    // Byte 14: inside the reply's operator line, so it follows that line.
+    EXPECT_EQ(Ctl("inject 14 ^RSSI: 4").second, 0);
+    EXPECT_EQ(exchange("AT+COPS?\r"),
+              "\r\n+COPS: 0,0,\"COSMOTE\"\r\n\r\n^RSSI: 4\r\n\r\nOK\r\n");
+    EXPECT_EQ(Ctl("inject x ^RSSI: 4").second, 1);
+    close(fd);
+    EXPECT_EQ(Stop(), 0);
 }
 
 TEST_F(ProgramTest, ScriptsRunAtStartAndStateOutlivesTheRun) {
