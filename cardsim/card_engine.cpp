@@ -258,6 +258,7 @@ bool CardEngine::RunCommand(const std::string& command, std::string& info, std::
     if (upper == "&F" || upper == "Z") {
         echo_ = true;
         charset_ = "8859-1";
+        cellularRing_ = callerId_ = false;
         return true;
     }
     if (upper.size() == 2 && upper[0] == 'X' && upper[1] >= '0' && upper[1] <= '5') return true;
@@ -351,6 +352,7 @@ bool CardEngine::RunCommand(const std::string& command, std::string& info, std::
 }
 
 void CardEngine::Tick(Clock::time_point now) {
+    if (Standard() && config_.vendorNoiseMs > 0) SendNoise(now);
     if (state_ == CallState::Dialing && commandRunning_ && now >= dialDecision_) {
         commandRunning_ = false;
         const bool dialable = !callNumber_.empty() &&
@@ -376,6 +378,25 @@ void CardEngine::Tick(Clock::time_point now) {
             SendRing();
             nextRing_ = now + std::chrono::milliseconds(config_.ringRepeatMs);
         }
+    }
+}
+
+// A standard modem's vendor lines that mean nothing to the dialer, now and then.
+void CardEngine::SendNoise(Clock::time_point now) {
+    if (nextNoise_ == Clock::time_point{})
+        nextNoise_ = now + std::chrono::milliseconds(config_.vendorNoiseMs);
+    if (now < nextNoise_) return;
+    nextNoise_ = now + std::chrono::milliseconds(config_.vendorNoiseMs);
+    switch (noiseCount_++ % 3) {
+        case 0:
+            Unsolicited("^RSSI: " + std::to_string(config_.signalQuality));
+            break;
+        case 1:
+            Unsolicited("+CREG: 1");
+            break;
+        default:
+            Unsolicited("^MODE: 3,2");
+            break;
     }
 }
 

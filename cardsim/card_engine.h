@@ -35,6 +35,7 @@ struct EngineConfig {
     int dialDelayMs = 2000;           // from ATD until the far end decides
     int ringRepeatMs = 3000;          // +CRING/+CLIP repeat while ringing
     int ringTimeoutMs = 30000;        // the caller gives up
+    int vendorNoiseMs = 0;            // standard: a vendor line this often, 0 never
 };
 
 // Call states as AT+CLCC reports them.
@@ -145,6 +146,7 @@ class CardEngine {
     void EndCall();
     void SetState(CallState state);
     void SendRing();
+    void SendNoise(Clock::time_point now);
     // Standard modem: where an unsolicited line may go in the output not yet taken.
     bool LineBoundary(size_t at, size_t start) const;
     void PlaceInjection(size_t replyStart);
@@ -183,6 +185,8 @@ class CardEngine {
     Clock::time_point dialDecision_{};
     Clock::time_point nextRing_{};
     Clock::time_point ringGivesUp_{};
+    Clock::time_point nextNoise_{};
+    unsigned noiseCount_ = 0;
     std::set<std::string> busy_, unanswered_;
     std::vector<char> dtmf_;
     unsigned garbageState_ = 12345;

@@ -40,6 +40,8 @@ constexpr char kUsage[] =
     "                        every change of a call, ^RSSI:/+CREG: when signal or network\n"
     "                        change, and unsolicited lines sent at once, even while a\n"
     "                        command is typed or between the lines of a reply\n"
+    "  --noise-ms N          standard dialect: a vendor line (^RSSI:, +CREG:, ^MODE:)\n"
+    "                        every N ms, 0 never (default 10000)\n"
     "  --dial-delay-ms N     time until the far end decides on a call (default 2000)\n"
     "  --script FILE         run control commands from FILE (\"wait MS\" pauses, # comments)\n"
     "  --state-dir DIR       where the card keeps its state between runs\n"
@@ -94,7 +96,7 @@ int main(int argc, char** argv) {
     config.runtimeDir = vqm::DefaultRuntimeRoot();
     std::string stateDir = DefaultStateDir(), scriptPath, firmware;
     bool powered = false;
-    int powerUpMs = 3000;
+    int powerUpMs = 3000, noiseMs = 10000;
     for (int i = 1; i < argc; ++i) {
         const std::string option = argv[i];
         const bool hasValue = i + 1 < argc;
@@ -122,6 +124,8 @@ int main(int argc, char** argv) {
         } else if (option == "--baud" && hasValue && ParseNumber(argv[i + 1], &config.baud)) {
             ++i;
         } else if (option == "--power-up-ms" && hasValue && ParseNumber(argv[i + 1], &powerUpMs)) {
+            ++i;
+        } else if (option == "--noise-ms" && hasValue && ParseNumber(argv[i + 1], &noiseMs)) {
             ++i;
         } else if (option == "--dial-delay-ms" && hasValue &&
                    ParseNumber(argv[i + 1], &config.engine.dialDelayMs)) {
@@ -152,6 +156,7 @@ int main(int argc, char** argv) {
     pthread_sigmask(SIG_BLOCK, &stopSignals, nullptr);
 
     config.stateFile = stateDir + "/card.state";
+    config.engine.vendorNoiseMs = noiseMs;
     CardSim card(config);
     if (!firmware.empty()) card.Control("firmware " + firmware);
     Companion companion(card, powerUpMs);

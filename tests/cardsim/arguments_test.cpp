@@ -29,10 +29,10 @@ TEST(Arguments, SplitRules) {
         {"\"Mary Ann\"", true, {{"Mary Ann", true, true}}},
         {"\"\",", true, {{"", true, true}, {"", false, false}}},
         {" \"x\" ,1", true, {{"x", true, true}, {"1", false, true}}},
-        {"\"abc", false, {}},     // unclosed
-        {"1,\"", false, {}},      // unclosed, empty
-        {"\"a\"b", false, {}},    // text after the closing quote
-        {"a\"b\"", false, {}},    // a quote after the field's text
+        {"\"abc", false, {}},   // unclosed
+        {"1,\"", false, {}},    // unclosed, empty
+        {"\"a\"b", false, {}},  // text after the closing quote
+        {"a\"b\"", false, {}},  // a quote after the field's text
         {"\"a\"\"b\"", false, {}},
     };
     for (const Case& c : cases) {

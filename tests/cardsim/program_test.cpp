@@ -128,8 +128,7 @@ TEST_F(ProgramTest, TheStandardPersonalityOnTheLine) {
     EXPECT_EQ(exchange("AT+GMR\r"), "\r\nREV1\r\n\r\nOK\r\n");
     // Byte 14: inside the reply's operator line, so it follows that line.
     EXPECT_EQ(Ctl("inject 14 ^RSSI: 4").second, 0);
-    EXPECT_EQ(exchange("AT+COPS?\r"),
-              "\r\n+COPS: 0,0,\"COSMOTE\"\r\n\r\n^RSSI: 4\r\n\r\nOK\r\n");
+    EXPECT_EQ(exchange("AT+COPS?\r"), "\r\n+COPS: 0,0,\"COSMOTE\"\r\n\r\n^RSSI: 4\r\n\r\nOK\r\n");
     EXPECT_EQ(Ctl("inject x ^RSSI: 4").second, 1);
     close(fd);
     EXPECT_EQ(Stop(), 0);

@@ -151,14 +151,21 @@ TEST_F(StandardModem, AVendorLineFollowsEveryChangeOfACall) {
     };
     modem_.engine.SetBusy("0800");
     const std::vector<Step> steps = {
-        {"ring", [](Modem& m) { m.engine.Ring("0123", m.now); return m.engine.TakeOutput(); },
+        {"ring",
+         [](Modem& m) {
+             m.engine.Ring("0123", m.now);
+             return m.engine.TakeOutput();
+         },
          Lines({"*ECAV: 1,6,1", "RING"})},
         {"answer", [](Modem& m) { return m.Send("ATA\r"); }, Lines({"*ECAV: 1,3,1", "OK"})},
         {"hang up", [](Modem& m) { return m.Send("ATH\r"); }, Lines({"*ECAV: 1,0,1", "OK"})},
         {"dial", [](Modem& m) { return m.Send("ATD+441234;\r"); }, Lines({"*ECAV: 1,1,1"})},
         {"connected", [](Modem& m) { return m.Advance(2000ms); }, Lines({"*ECAV: 1,3,1", "OK"})},
         {"far end hangs up",
-         [](Modem& m) { m.engine.RemoteHangUp(); return m.engine.TakeOutput(); },
+         [](Modem& m) {
+             m.engine.RemoteHangUp();
+             return m.engine.TakeOutput();
+         },
          Lines({"*ECAV: 1,0,1", "NO CARRIER"})},
         {"dial a busy number", [](Modem& m) { return m.Send("ATD0800;\r"); },
          Lines({"*ECAV: 1,1,1"})},
@@ -170,11 +177,23 @@ TEST_F(StandardModem, AVendorLineFollowsEveryChangeOfACall) {
              return m.engine.TakeOutput();
          },
          Lines({"*ECAV: 1,6,1", "RING", "*ECAV: 1,0,1"})},
-        {"signal", [](Modem& m) { m.engine.SetSignal(7); return m.engine.TakeOutput(); },
+        {"signal",
+         [](Modem& m) {
+             m.engine.SetSignal(7);
+             return m.engine.TakeOutput();
+         },
          Lines({"^RSSI: 7"})},
-        {"same signal", [](Modem& m) { m.engine.SetSignal(7); return m.engine.TakeOutput(); },
+        {"same signal",
+         [](Modem& m) {
+             m.engine.SetSignal(7);
+             return m.engine.TakeOutput();
+         },
          ""},
-        {"network", [](Modem& m) { m.engine.SetOperator(20205); return m.engine.TakeOutput(); },
+        {"network",
+         [](Modem& m) {
+             m.engine.SetOperator(20205);
+             return m.engine.TakeOutput();
+         },
          Lines({"+CREG: 1"})},
     };
     for (const Step& step : steps)
@@ -216,6 +235,22 @@ TEST_F(StandardModem, UnsolicitedLinesGoOutAtOnceAndBetweenReplyLines) {
     modem_.Send("ATD+441234;\r");
     modem_.engine.Unsolicited("+CMTI: \"SM\",4");
     EXPECT_EQ(modem_.engine.TakeOutput(), Lines({"+CMTI: \"SM\",4"}));
+}
+
+TEST(VendorNoise, NowAndThenOnAStandardModemOnly) {
+    for (Dialect dialect : {Dialect::Standard, Dialect::Card}) {
+        EngineConfig config = Config(dialect);
+        config.vendorNoiseMs = 1000;
+        CardEngine engine(config);
+        auto at = Clock::time_point{} + 1h;
+        std::string out;
+        for (int ms = 0; ms <= 3500; ms += 100) {
+            engine.Tick(at + std::chrono::milliseconds(ms));
+            out += engine.TakeOutput();
+        }
+        EXPECT_EQ(out,
+                  dialect == Dialect::Card ? "" : Lines({"^RSSI: 20", "+CREG: 1", "^MODE: 3,2"}));
+    }
 }
 
 TEST(CardDialect, UnsolicitedLinesWaitForAPendingDial) {
@@ -267,9 +302,8 @@ TEST(CardPower, LosingPowerDropsTheCall) {
         const char* setUp;
         const char* powerOff;
     };
-    const Case cases[] = {{"local-answer", "pull"},
-                          {"local-answer", "power-down"},
-                          {"", "pull"}};  // still ringing
+    const Case cases[] = {
+        {"local-answer", "pull"}, {"local-answer", "power-down"}, {"", "pull"}};  // still ringing
     for (const Case& c : cases) {
         SimConfig config;
         config.baud = 0;
