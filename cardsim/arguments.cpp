@@ -47,11 +47,4 @@ size_t CommandEnd(const std::string& text, size_t from) {
     return text.size();
 }
 
-bool QuotesClosed(const std::string& text) {
-    size_t quotes = 0;
-    for (char c : text)
-        quotes += c == '"';
-    return quotes % 2 == 0;
-}
-
 }  // namespace vqm::cardsim

@@ -24,7 +24,4 @@ bool SplitArguments(const std::string& text, std::vector<Argument>* out);
 // or text.size(). A ';' inside quotes belongs to a name or a text.
 size_t CommandEnd(const std::string& text, size_t from);
 
-// True when every quote in text is closed.
-bool QuotesClosed(const std::string& text);
-
 }  // namespace vqm::cardsim
