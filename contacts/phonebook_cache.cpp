@@ -5,6 +5,7 @@
 #include <filesystem>
 #include <thread>
 
+#include "support/files.h"
 #include "support/lock_within.h"
 #include "support/numbers.h"
 #include "support/settings_store.h"
@@ -161,6 +162,133 @@ int OutlookCacheFindName(CacheGroup& group, const char* number, char16_t* name, 
         if (found) return 1;
     }
     return 0;
+}
+
+void CacheWorkers::ReapFinished() {
+    for (auto it = workers_.begin(); it != workers_.end();) {
+        if (it->done->load()) {
+            it->thread.join();
+            it = workers_.erase(it);
+        } else {
+            ++it;
+        }
+    }
+}
+
+void CacheWorkers::Start(std::function<void()> body) {
+    auto done = std::make_shared<std::atomic<bool>>(false);
+    std::lock_guard<std::mutex> lock(mutex_);
+    ReapFinished();
+    workers_.push_back(Worker{std::thread([body = std::move(body), done] {
+                                  body();
+                                  done->store(true);
+                              }),
+                              done});
+}
+
+bool CacheWorkers::Busy() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    for (const Worker& worker : workers_)
+        if (!worker.done->load()) return true;
+    return false;
+}
+
+void CacheWorkers::JoinAll(const std::function<void(const std::function<bool()>&)>& wait) {
+    if (wait) wait([this] { return !Busy(); });
+    std::list<Worker> all;
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        all.swap(workers_);
+    }
+    for (Worker& worker : all)
+        worker.thread.join();
+}
+
+namespace {
+
+// Copies file n to "<path>.tmp" record by record, writing what change gives for each record
+// (nothing when it returns false), flushes the copy to disk and renames it over the file, so
+// that a crash leaves the old file or the new one. A copy left empty removes the file when
+// dropEmpty. Runs under the write state.
+template <typename Change>
+int RewriteSimFile(CacheGroup& group, int fileNumber, bool dropEmpty, Change change) {
+    if (!ValidFile(group, fileNumber) || group.id != CacheGroupId::Sim) return 0;
+    if (!CacheAcquire(group.lock, kCacheWrite)) return 0;
+    const std::string path = CachePath(group, fileNumber);
+    const std::string tmpPath = path + ".tmp";
+    int result = 0;
+    FILE* in = std::fopen(path.c_str(), "rb");
+    FILE* out = in ? std::fopen(tmpPath.c_str(), "wb") : nullptr;
+    if (in && out) {
+        PhonebookEntry record;
+        bool ok = true;
+        long written = 0;
+        while (ok && std::fread(&record, 1, sizeof record, in) == sizeof record) {
+            if (!change(record)) continue;
+            ok = std::fwrite(&record, 1, sizeof record, out) == sizeof record;
+            ++written;
+        }
+        std::fclose(in);
+        in = nullptr;
+        ok = FlushToDisk(out) && ok;
+        ok = std::fclose(out) == 0 && ok;
+        out = nullptr;
+        if (ok && dropEmpty && written == 0) {
+            std::remove(path.c_str());
+            std::remove(tmpPath.c_str());
+            result = 1;
+        } else if (ok && std::rename(tmpPath.c_str(), path.c_str()) == 0) {
+            result = 1;
+        }
+    }
+    if (in) std::fclose(in);
+    if (out) std::fclose(out);
+    if (!result) std::remove(tmpPath.c_str());
+    CacheRelease(group.lock);
+    return result;
+}
+
+}  // namespace
+
+int SimCacheNextFreeIndex(CacheGroup& group, int fileNumber) {
+    constexpr int kIndexLimit = 512;
+    bool used[kIndexLimit] = {};
+    ScanFile(group, fileNumber, [&](const unsigned char* bytes) {
+        int32_t index;
+        std::memcpy(&index, bytes, sizeof index);
+        if (index >= 0 && index < kIndexLimit) used[index] = true;
+        return false;
+    });
+    for (int index = 1; index < kIndexLimit; ++index)
+        if (!used[index]) return index;
+    return 0;
+}
+
+int SimCacheAppend(CacheGroup& group, int fileNumber, const PhonebookEntry& entry) {
+    if (group.id != CacheGroupId::Sim) return 0;
+    FILE* stream = CacheOpen(group, fileNumber, kCacheWrite);
+    const bool opened = stream != nullptr;
+    if (stream) std::fwrite(&entry, 1, sizeof entry, stream);
+    CacheClose(group, stream);
+    return opened ? 1 : 0;
+}
+
+int SimCacheReplace(CacheGroup& group, int fileNumber, const PhonebookEntry& entry) {
+    return RewriteSimFile(group, fileNumber, false, [&](PhonebookEntry& record) {
+        if (record.index == entry.index) record = entry;
+        return true;
+    });
+}
+
+int SimCacheRemove(CacheGroup& group, int fileNumber, int index) {
+    if (index < 1) return 0;
+    return RewriteSimFile(group, fileNumber, true,
+                          [&](const PhonebookEntry& record) { return record.index != index; });
+}
+
+void CacheDeleteFiles(CacheGroup& group) {
+    for (int n = 1; n <= CacheFileCount(group); ++n)
+        std::remove(CachePath(group, n).c_str());
 }
 
 int FindNameByNumber(PhonebookCaches& caches, const char* number, char16_t* name, size_t nameSize) {

@@ -10,8 +10,12 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstdio>
+#include <functional>
+#include <list>
+#include <memory>
 #include <mutex>
 #include <string>
+#include <thread>
 
 #include "contacts/phonebook_entry.h"
 
@@ -68,6 +72,34 @@ struct CacheGroup {
     CacheLock lock;
 };
 
+// The builder threads and the short "done" reporters, kept so that each is joined rather than
+// left running when the program ends.
+class CacheWorkers {
+  public:
+    CacheWorkers() = default;
+    CacheWorkers(const CacheWorkers&) = delete;
+    CacheWorkers& operator=(const CacheWorkers&) = delete;
+    ~CacheWorkers() { JoinAll(); }
+
+    // Runs body on a thread of its own; threads that have finished are joined first.
+    void Start(std::function<void()> body);
+    // Waits for every thread and joins it. wait, when given, is how the caller waits (the
+    // view's thread keeps delivering the workers' sends meanwhile, so none of them blocks).
+    void JoinAll(const std::function<void(const std::function<bool()>& done)>& wait = {});
+    // True while some thread has not finished its body.
+    bool Busy();
+
+  private:
+    struct Worker {
+        std::thread thread;
+        std::shared_ptr<std::atomic<bool>> done;
+    };
+    void ReapFinished();  // with mutex_ held
+
+    std::mutex mutex_;
+    std::list<Worker> workers_;
+};
+
 // Both groups, made once with the main window and shared by every reader and builder.
 struct PhonebookCaches {
     explicit PhonebookCaches(SettingsStore& settings)
@@ -75,6 +107,11 @@ struct PhonebookCaches {
 
     CacheGroup sim;
     CacheGroup outlook;
+    // The pauses of the builders and reporters (500 ms between storages, before a "done"
+    // without a build); tests shorten them.
+    std::function<void(int ms)> pause;
+    // Declared last: threads still running use the groups above, so they are joined first.
+    CacheWorkers workers;
 };
 
 // Files in the group (2 SIM, 3 Outlook), the record size of file n (1-based), and its path
@@ -114,6 +151,24 @@ int SimCacheFindName(CacheGroup& group, const char* number, char16_t* name, size
 // The same over the mobile, home and work files, comparing only the first number of a home or
 // work record.
 int OutlookCacheFindName(CacheGroup& group, const char* number, char16_t* name, size_t nameSize);
+
+// The write side of the SIM group (file 1 SIM, 2 Card Phone).
+
+// The smallest index 1..511 that no record of the file uses; 0 when all are taken. A missing or
+// empty file gives 1. Indices outside 0..511 in the file are ignored.
+int SimCacheNextFreeIndex(CacheGroup& group, int fileNumber);
+// Appends the 80 bytes of entry under the write state; 1 when the file opened.
+int SimCacheAppend(CacheGroup& group, int fileNumber, const PhonebookEntry& entry);
+// Rewrites the file through "<path>.tmp" (flushed to disk before it is renamed over the file),
+// with entry in place of every record of its index. 1 when done; 0 when the lock was refused
+// or the file could not be opened (the temporary copy is then removed).
+int SimCacheReplace(CacheGroup& group, int fileNumber, const PhonebookEntry& entry);
+// The same copy without the records of index; a file left empty is deleted. An index below 1
+// is refused with 0.
+int SimCacheRemove(CacheGroup& group, int fileNumber, int index);
+// Deletes every file of the group (the lock is not taken: callers hold the write state or know
+// that no builder runs).
+void CacheDeleteFiles(CacheGroup& group);
 
 // The look-up the call log, alerts and message lists use: SIM group first, then Outlook.
 int FindNameByNumber(PhonebookCaches& caches, const char* number, char16_t* name, size_t nameSize);
