@@ -8,6 +8,7 @@
 #include <sstream>
 #include <vector>
 
+#include "cardsim/arguments.h"
 #include "cardsim/card_engine.h"
 #include "support/gsm.h"
 #include "support/text.h"
@@ -56,32 +57,13 @@ bool HexBytes(const std::string& hex, std::vector<uint8_t>* out) {
 }
 
 // One field of an AT argument list: quoted text keeps its case and commas.
-struct Field {
-    bool quoted = false;
-    bool present = false;
-    std::string text;
-};
+using Field = Argument;
 
+// The card's one argument splitter (cardsim/arguments.h); no parameters are no fields. The
+// engine refuses parameters that do not split before they get here.
 std::vector<Field> Fields(const std::string& args) {
-    std::vector<Field> fields(1);
-    bool inQuotes = false;
-    for (char c : args) {
-        Field& field = fields.back();
-        if (inQuotes) {
-            if (c == '"')
-                inQuotes = false;
-            else
-                field.text.push_back(c);
-        } else if (c == '"') {
-            inQuotes = field.quoted = field.present = true;
-        } else if (c == ',') {
-            fields.emplace_back();
-        } else if (c != ' ') {
-            field.text.push_back(c);
-            field.present = true;
-        }
-    }
-    if (args.empty()) fields.clear();
+    std::vector<Field> fields;
+    if (!SplitArguments(args, &fields) || args.empty()) fields.clear();
     return fields;
 }
 

@@ -6,6 +6,7 @@
 #include <sstream>
 #include <vector>
 
+#include "cardsim/arguments.h"
 #include "cardsim/card_engine.h"
 #include "support/gsm.h"
 #include "support/text.h"
@@ -20,31 +21,14 @@ struct Field {
     bool quoted = false;
 };
 
-// Splits "a,\"b,c\",d" into its fields; false for an unclosed quote.
+// The card's one argument splitter (cardsim/arguments.h); false for an unclosed quote.
 bool SplitFields(const std::string& text, std::vector<Field>& fields) {
+    std::vector<Argument> arguments;
+    const bool ok = SplitArguments(text, &arguments);
     fields.clear();
-    Field field;
-    bool inQuotes = false;
-    for (char c : text) {
-        if (inQuotes) {
-            if (c == '"')
-                inQuotes = false;
-            else
-                field.value.push_back(c);
-        } else if (c == '"') {
-            if (field.quoted || !field.value.empty()) return false;
-            inQuotes = field.quoted = true;
-        } else if (c == ',') {
-            fields.push_back(field);
-            field = Field{};
-        } else if (c != ' ') {
-            if (field.quoted) return false;  // text after a closing quote
-            field.value.push_back(c);
-        }
-    }
-    if (inQuotes) return false;
-    fields.push_back(field);
-    return true;
+    for (const Argument& argument : arguments)
+        fields.push_back({argument.text, argument.quoted});
+    return ok;
 }
 
 bool WholeNumber(const std::string& text, int* value) {
