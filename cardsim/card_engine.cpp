@@ -144,9 +144,9 @@ void CardEngine::RunPromptByte(char c) {
         prompting_ = nullptr;
         promptText_.clear();
         Result("OK");
-    } else if (promptText_.size() < kMaxPromptText) {
-        promptText_.push_back(c);
-        return;
+    } else {
+        if (promptText_.size() < kMaxPromptText) promptText_.push_back(c);
+        return;  // no reply yet
     }
     if (injection_.armed) PlaceInjection(replyStart);
 }
