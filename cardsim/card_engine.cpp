@@ -506,6 +506,11 @@ void CardEngine::PowerLost() {
     unsolicitedEnd_ = 0;
     partlyTaken_ = false;
     injection_.armed = false;
+    // A modem that comes back from a power cut has its start-up settings again.
+    if (Standard()) {
+        cellularRing_ = callerId_ = false;
+        errorMode_ = 1;
+    }
 }
 
 void CardEngine::SetState(CallState state) {

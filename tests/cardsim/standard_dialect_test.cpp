@@ -93,6 +93,10 @@ TEST_F(StandardModem, RepliesInOrder) {
     };
     for (const Step& step : steps)
         EXPECT_EQ(modem_.Send(step.command), step.reply) << step.command;
+    // Back from a power cut, the start-up settings hold again.
+    modem_.engine.PowerLost();
+    EXPECT_EQ(modem_.Send("AT+CLIP?;+CRC?;+CMEE?\r"),
+              Lines({"+CLIP: 0,1", "+CRC: 0", "+CMEE: 1", "OK"}));
 }
 
 TEST_F(StandardModem, OperatorFormatTakesACodeTheNamesDoNotKnow) {
