@@ -112,7 +112,8 @@ class CardEngine {
     // unsolicited line ("^RSSI: <n>", "+CREG: 1") that the dialer has to ignore.
     void SetSignal(int quality);
     void SetOperator(int code);
-    // Power lost (pulled, powered down): every call is dropped and a half-typed command is lost.
+    // Power lost (pulled, powered down): every call is dropped, a half-typed command is lost and
+    // a standard modem's +CRC, +CLIP and +CMEE return to their start-up values.
     void PowerLost();
 
     // Settings that outlive a run change through ChangeConfig() or the setters; each change
