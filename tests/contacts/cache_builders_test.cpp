@@ -351,6 +351,26 @@ TEST_F(CacheBuildersTest, TheDemoSimIsCopiedWholeAndLookedUpByNumber) {
     EXPECT_FALSE(SimFile(2).empty());
 }
 
+TEST_F(CacheBuildersTest, ACardPulledBetweenTheBooksLeavesTheSimBookWhole) {
+    cardsim::SimConfig config;
+    config.baud = 0;
+    config.runtimeDir = temp_ / "sim";
+    config.stateFile = temp_ / "card.state";
+    cardsim::CardSim sim(config);
+    ASSERT_TRUE(sim.PowerUp());
+    ASSERT_EQ(sim.Control("phonebook-fill SM 250"), "OK");
+    ASSERT_EQ(PortOpenDevice(*link_, sim.DevicePath().c_str()), 1);
+    // The pause after the SIM's book is where the card goes.
+    caches_.pause = [&sim](int) { sim.Control("pull"); };
+    SimCacheBuild(caches_, *link_, Notifier());
+    EXPECT_EQ(WaitReports(1), std::vector<unsigned>{kSimCacheDone});
+    EXPECT_EQ(SimFile(1).size(), 250u);
+    EXPECT_TRUE(SimFile(2).empty());
+    EXPECT_EQ(caches_.sim.lock.state.load(), kCacheFree);
+    PortClose(*link_);
+}
+
+// The address-book builder
 // The address-book builder
 
 AddressBookContact Contact(std::u16string name, std::u16string mobile, std::u16string home = {},

@@ -88,5 +88,52 @@ TEST_F(CardPhonebooksTest, QuotedCommasAndMalformedWritesChangeNothing) {
     EXPECT_GT(engine_.Revision(), revision);
 }
 
+// Every place of both books takes a write, reads it back, and gives it up again; the places
+// just outside the book are refused as a SIM refuses them.
+TEST_F(CardPhonebooksTest, EveryPlaceWritesReadsAndDeletes) {
+    struct Book {
+        const char* name;
+        int total;
+    };
+    for (const Book& book : {Book{"SM", 250}, Book{"ME", 100}}) {
+        ASSERT_EQ(Send(std::string("AT+CPBS=\"") + book.name + "\""), "\r\nOK\r\n");
+        Send("AT+CPBS?");
+        for (int i = 1; i <= book.total; ++i) {
+            const std::string index = std::to_string(i);
+            ASSERT_EQ(Send("AT+CPBW=" + index + ",\"+" + index + "\",145,\"N" + index + "\""),
+                      "\r\nOK\r\n")
+                << book.name << i;
+            ASSERT_EQ(Send("AT+CPBR=" + index),
+                      "\r\n+CPBR: " + index + ",\"+" + index + "\",145,\"N" + index +
+                          "\"\r\n\r\nOK\r\n");
+        }
+        const std::string total = std::to_string(book.total);
+        EXPECT_EQ(Send("AT+CPBS?"), "\r\n+CPBS: \"" + std::string(book.name) + "\"," + total +
+                                        "," + total + "\r\n\r\nOK\r\n");
+        // Full: a write without a place is the card's memory-full error; a named place is
+        // overwritten.
+        EXPECT_EQ(Send("AT+CPBW=,\"123\",129,\"Extra\""), "\r\nERROR\r\n");
+        EXPECT_EQ(Send("AT+CPBW=" + total + ",\"9\",129,\"Last\""), "\r\nOK\r\n");
+        for (const std::string& outside : {std::string("0"), std::to_string(book.total + 1)}) {
+            EXPECT_EQ(Send("AT+CPBW=" + outside + ",\"1\",129,\"x\""), "\r\nERROR\r\n");
+            EXPECT_EQ(Send("AT+CPBW=" + outside), "\r\nERROR\r\n");
+            EXPECT_EQ(Send("AT+CPBR=" + outside), "\r\nERROR\r\n");
+        }
+        EXPECT_EQ(Send("AT+CPBR=1," + std::to_string(book.total + 1)), "\r\nERROR\r\n");
+        for (int i = book.total; i >= 1; --i)
+            ASSERT_EQ(Send("AT+CPBW=" + std::to_string(i)), "\r\nOK\r\n") << book.name << i;
+        // Deleting an empty place is no error; reading an empty range lists nothing.
+        EXPECT_EQ(Send("AT+CPBW=5"), "\r\nOK\r\n");
+        EXPECT_EQ(Send("AT+CPBR=1," + total), "\r\nOK\r\n");
+        EXPECT_EQ(Send("AT+CPBS?"), "\r\n+CPBS: \"" + std::string(book.name) + "\",0," + total +
+                                        "\r\n\r\nOK\r\n");
+        // The first free place is the lowest one.
+        Send("AT+CPBW=1,\"1\",129,\"a\"");
+        Send("AT+CPBW=3,\"3\",129,\"c\"");
+        EXPECT_EQ(Send("AT+CPBW=,\"2\",129,\"b\""), "\r\nOK\r\n");
+        EXPECT_EQ(Send("AT+CPBR=2"), "\r\n+CPBR: 2,\"2\",129,\"b\"\r\n\r\nOK\r\n");
+    }
+}
+
 }  // namespace
 }  // namespace vqm::cardsim
