@@ -7,6 +7,7 @@
 #include "calls/unsolicited.h"
 #include "contacts/phonebook_cache.h"
 #include "link/link.h"
+#include "messaging/message_store.h"
 #include "support/local_socket.h"
 #include "support/settings_store.h"
 #include "support/text.h"
@@ -137,6 +138,28 @@ int OnCallerId(DialPad& pad, const EventRecord& record) {
     return 0;
 }
 
+int NewMessageLocation(const EventRecord& record, char* memory, size_t memorySize) {
+    const int length = record.length;
+    if (length < 7) return -1;
+    const char* end = record.text + length;
+    char name[16];
+    int copied = 0;
+    const char* p = ParseQuoted(record.text + 6, end, name, sizeof name, &copied);
+    if (memory && memorySize > 0) std::snprintf(memory, memorySize, "%s", p ? name : "");
+    int32_t location = -1;
+    if (!p || p >= end || *p != ',' || !ParseInt(p + 1, end, &location)) return -1;
+    return location;
+}
+
+int OnNewMessage(DialPad& pad, const EventRecord& record) {
+    if (record.length < 7) return 0;
+    SettingsStore& settings = pad.Settings();
+    SmsNoteNewMessage(settings, pad.LinkRef(), NewMessageLocation(record),
+                      [&pad](int full) { NotifySimFull(pad, full); });
+    NotifyNewMessages(pad, 1, UnreadMessageCount(settings));
+    return 0;
+}
+
 void NotifyNewMessages(DialPad& pad, int show, int unreadCount) {
     if (!show) {
         if (pad.Notifications().lastKind == kNoticeNewMessages) ClearNotice(pad);
@@ -186,6 +209,10 @@ void InstallCallHandlers(UnsolicitedEvents& events, DialPad& pad,
     });
     events.SetHandler(kEventCallerId, [&pad, onPadThread](const EventRecord& record) {
         onPadThread([&] { OnCallerId(pad, record); });
+        return 0;
+    });
+    events.SetHandler(kEventNewMessage, [&pad, onPadThread](const EventRecord& record) {
+        onPadThread([&] { OnNewMessage(pad, record); });
         return 0;
     });
 }

@@ -34,6 +34,13 @@ int OnIncomingCall(DialPad& pad, const EventRecord& record);
 // and in the number display. Returns 0.
 int OnCallerId(DialPad& pad, const EventRecord& record);
 
+// "+CMTI:": the location joins the new messages (the full-SIM alert first when the SIM is full)
+// and the DialPad announces the unread count. Returns 0.
+int OnNewMessage(DialPad& pad, const EventRecord& record);
+// The location of a "+CMTI:" record: the integer after the quoted memory name and ",", -1 when
+// there is none; the memory name goes to memory when given.
+int NewMessageLocation(const EventRecord& record, char* memory = nullptr, size_t memorySize = 0);
+
 // The caller's number of a "+CLIP:" record: unquoted up to firmware 3.81 (blanks skipped, then
 // digits and "+"), the quoted field after. Writes at most numberSize - 1 bytes and a NUL;
 // returns the length, 0 when there is none.
@@ -48,9 +55,9 @@ void NotifySimFull(DialPad& pad, int full);
 // it speaks of opens: the Call Log for unanswered calls, the SMS Folder otherwise.
 void NotificationTapped(DialPad& pad);
 
-// Installs OnIncomingCall and OnCallerId into the events' table. Handlers may be dispatched on
-// the listener or the dial thread; onPadThread runs the work on the DialPad's own thread and
-// waits for it.
+// Installs OnIncomingCall, OnCallerId and OnNewMessage into the events' table. Handlers may be
+// dispatched on the listener or the dial thread; onPadThread runs the work on the DialPad's own
+// thread and waits for it.
 void InstallCallHandlers(UnsolicitedEvents& events, DialPad& pad,
                          std::function<void(const std::function<void()>&)> onPadThread);
 

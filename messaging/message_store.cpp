@@ -340,8 +340,9 @@ void StoreStartSimRefresh(MessageStore& store, Link& link, std::function<void()>
     store.refreshRunning = true;
     store.refresh = std::thread([&store, &link, done = std::move(done)] {
         StoreRefreshSim(store, link);
-        store.refreshRunning = false;
         if (done) done();
+        // Cleared only once the notice was taken, so a waiter that delivers it sees it through.
+        store.refreshRunning = false;
     });
 }
 

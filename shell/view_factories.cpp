@@ -1,10 +1,40 @@
 #include "shell/view_factories.h"
 
+#include "calls/alerts.h"
 #include "calls/call_log_view.h"
 #include "calls/dial_pad_view.h"
 #include "contacts/manage_contacts_view.h"
+#include "messaging/sms_folder_view.h"
+#include "shell/messages.h"
 
 namespace vqm {
+
+namespace {
+
+DialPad* PadOf(ShellContext& context) {
+    if (!context.mainWindow) return nullptr;
+    auto* view = dynamic_cast<DialPadView*>(context.mainWindow->ViewAt(kViewDialPad));
+    return view ? &view->Pad() : nullptr;
+}
+
+// The SMS Folder raises and clears the DialPad's full-SIM notice, and its new-message notice
+// goes once every announced message is listed.
+FolderViewHooks FolderHooks(ShellContext& context) {
+    FolderViewHooks hooks;
+    hooks.simFullAlert = [&context](int full) {
+        if (DialPad* pad = PadOf(context)) NotifySimFull(*pad, full);
+    };
+    hooks.newMessagesTaken = [&context] {
+        DialPad* pad = PadOf(context);
+        if (pad && IndexListCount(context.settings, kNewIdx) == 0) NotifyNewMessages(*pad, 0, 0);
+    };
+    hooks.showWriteView = [&context] {
+        if (context.mainWindow) context.mainWindow->Command(kCmdViewFirst + kViewWriteSms);
+    };
+    return hooks;
+}
+
+}  // namespace
 
 std::array<ViewFactory, kViewCount> DefaultViewFactories() {
     std::array<ViewFactory, kViewCount> factories;
@@ -13,6 +43,9 @@ std::array<ViewFactory, kViewCount> DefaultViewFactories() {
     };
     for (int i = 1; i < kViewCount; ++i)
         factories[i] = [](QWidget* parent, ShellContext&) { return new View(parent); };
+    factories[kViewSmsFolder] = [](QWidget* parent, ShellContext& context) -> View* {
+        return new SmsFolderView(parent, context, context.caches, FolderHooks(context));
+    };
     factories[kViewManageContacts] = [](QWidget* parent, ShellContext& context) -> View* {
         return new ManageContactsView(
             parent, context, context.caches,
