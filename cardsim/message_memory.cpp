@@ -1,5 +1,6 @@
 #include "cardsim/message_memory.h"
 
+#include <algorithm>
 #include <cctype>
 #include <cstdint>
 #include <cstdio>
@@ -267,6 +268,72 @@ std::string DeliverUserData(const std::string& utf8, int* coding, int* length) {
     *length = static_cast<int>(text.size() * 2);
     TextToUcs2Hex(text.data(), text.size() * 2, hex, sizeof hex);
     return hex;
+}
+
+// A sender's name (a bank, an operator) in place of a number: letters and digits, at most 11.
+bool IsAlphanumericSender(const std::string& name) {
+    if (name.empty() || name.size() > 11) return false;
+    bool letter = false;
+    for (char c : name) {
+        if (!std::isalnum(static_cast<unsigned char>(c))) return false;
+        letter = letter || std::isalpha(static_cast<unsigned char>(c));
+    }
+    return letter;
+}
+
+// The name as an address: its 7-bit characters packed, the length in semi-octets, type 0xD0.
+std::string EncodeAlphanumericAddress(const std::string& name) {
+    std::vector<uint8_t> codes;
+    for (char c : name)
+        codes.push_back(static_cast<uint8_t>(LatinToGsmCode(static_cast<uint8_t>(c))));
+    char hex[64];
+    PackGsmCodes(codes.data(), static_cast<int>(codes.size()), hex, sizeof hex);
+    const int semiOctets = (static_cast<int>(codes.size()) * 7 + 3) / 4;
+    return HexOctet(semiOctets) + "D0" + hex;
+}
+
+// A text too long for one message as the network sends it: parts of 153 septets (or 67 UCS2
+// characters), each behind a concatenation header naming the reference, the count and its
+// place. Each entry is {coding, user-data length, user data}.
+struct DeliveryPart {
+    int coding;
+    int length;
+    std::string userData;
+};
+std::vector<DeliveryPart> SplitForDelivery(const std::string& utf8, int reference) {
+    const std::u16string text = Utf8ToUtf16(utf8);
+    std::vector<uint8_t> codes;
+    bool septets = true;
+    for (char16_t c : text) {
+        const int code = WideToGsmCode(c);
+        if (code < 0 || code == 0x1B) {
+            septets = false;
+            break;
+        }
+        codes.push_back(static_cast<uint8_t>(code));
+    }
+    const size_t per = septets ? 153 : 67;
+    const size_t units = septets ? codes.size() : text.size();
+    const int total = static_cast<int>((units + per - 1) / per);
+    std::vector<DeliveryPart> parts;
+    for (int n = 0; n < total; ++n) {
+        const std::string header =
+            "050003" + HexOctet(reference) + HexOctet(total) + HexOctet(n + 1);
+        const size_t from = n * per, count = std::min(per, units - from);
+        if (septets) {
+            // Seven septets of room for the six header octets and the fill bit before the text.
+            std::vector<uint8_t> padded(7, 0);
+            padded.insert(padded.end(), codes.begin() + from, codes.begin() + from + count);
+            char hex[400];
+            PackGsmCodes(padded.data(), static_cast<int>(padded.size()), hex, sizeof hex);
+            parts.push_back({0, static_cast<int>(padded.size()), header + (hex + 12)});
+        } else {
+            char hex[400];
+            TextToUcs2Hex(text.data() + from, count * 2, hex, sizeof hex);
+            parts.push_back({8, static_cast<int>(6 + count * 2), header + hex});
+        }
+    }
+    return parts;
 }
 
 std::string NowStamp() {
@@ -666,17 +733,30 @@ std::string MessageMemory::Control(const std::string& command, const std::string
         std::istringstream words(rest);
         std::string number;
         words >> number;
-        if (!IsDialNumber(number)) return "ERROR: deliver needs a number and a text";
+        const bool named = !IsDialNumber(number) && IsAlphanumericSender(number);
+        if (!IsDialNumber(number) && !named)
+            return "ERROR: deliver needs a number (or a sender's name) and a text";
         const size_t textAt = rest.find_first_not_of(" \t", rest.find(number) + number.size());
         const std::string text = textAt == std::string::npos ? "" : rest.substr(textAt);
+        const std::string centre = centre_.empty() ? "00" : EncodeAddress(centre_, true);
+        const std::string sender =
+            named ? EncodeAlphanumericAddress(number) : EncodeAddress(number, false);
         int coding = 0, length = 0;
         const std::string userData = DeliverUserData(text, &coding, &length);
-        if (userData == "!") return "ERROR: text too long for one message";
-        const std::string centre = centre_.empty() ? "00" : EncodeAddress(centre_, true);
-        const std::string why =
-            Deliver(centre + "04" + EncodeAddress(number, false) + "00" + HexOctet(coding) +
-                    NowStamp() + HexOctet(length) + userData);
-        return why.empty() ? "OK" : why;
+        if (userData != "!") {
+            const std::string why = Deliver(centre + "04" + sender + "00" + HexOctet(coding) +
+                                            NowStamp() + HexOctet(length) + userData);
+            return why.empty() ? "OK" : why;
+        }
+        // Too long for one message: the parts arrive one by one, as from a network.
+        const std::vector<DeliveryPart> parts = SplitForDelivery(text, ++nextConcatReference_ & 0xFF);
+        if (parts.size() > 255) return "ERROR: text too long";
+        for (const DeliveryPart& part : parts) {
+            const std::string why = Deliver(centre + "44" + sender + "00" + HexOctet(part.coding) +
+                                            NowStamp() + HexOctet(part.length) + part.userData);
+            if (!why.empty()) return why;
+        }
+        return "OK";
     }
     if (command == "deliver-pdu") {
         std::string hex;
@@ -705,7 +785,8 @@ std::string MessageMemory::Control(const std::string& command, const std::string
 }
 
 std::string MessageMemory::ControlHelp() const {
-    return "  deliver NUMBER TEXT      a short message from NUMBER arrives on the SIM\n"
+    return "  deliver NUMBER TEXT      a short message from NUMBER (or a name such as MyBank)\n"
+           "                           arrives on the SIM; a long text arrives in parts\n"
            "  deliver-pdu HEX          an SMS-DELIVER PDU (centre address first) arrives\n"
            "  capacity N               the SIM holds N messages (1..255)\n";
 }

@@ -64,6 +64,7 @@ class MessageMemory : public CommandSet {
     int centreType_ = 145;
     int firstOctet_ = 17, validity_ = 167, protocol_ = 0, coding_ = 0;  // AT+CSMP
     int nextReference_ = 0;
+    int nextConcatReference_ = 0;  // the reference of a long delivery's parts
     Pending pending_ = Pending::None;
     int pendingLength_ = 0;
     int pendingStat_ = StoUnsent;

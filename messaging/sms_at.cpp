@@ -56,12 +56,21 @@ const char* StatusWord(int stat) {
 // body goes into reply. 0 when either got no reply or no prompt came.
 int PromptAndBody(Link& link, const char* command, char* body, size_t bodyLength, size_t bodySize,
                   char* reply, size_t replySize) {
-    int length = Exchange(link, command, reply, replySize);
-    if (length == 0 || FindPattern(0, ">", 1, reply, length) < 0) return 0;
     if (bodyLength + 2 > bodySize) return 0;
     body[bodyLength] = kCtrlZ;
     body[bodyLength + 1] = '\0';
-    return Exchange(link, body, reply, replySize);
+    // The port stays ours from the command to the text: anything sent between would be taken
+    // into the message.
+    if (!PortLock(link)) return 0;
+    ExchangeOptions held;
+    held.lockHeld = true;
+    int length = static_cast<int>(AtExchange(link, command, reply, replySize, held));
+    if (length > 0 && FindPattern(0, ">", 1, reply, length) >= 0)
+        length = static_cast<int>(AtExchange(link, body, reply, replySize, held));
+    else
+        length = 0;
+    PortUnlock(link);
+    return length;
 }
 
 // "AT+CMGW" and "AT+CMGS" in PDU mode differ only in the command and the confirmation.
@@ -177,6 +186,111 @@ int SmsStorageFull(Link& link) {
     return used == total ? 1 : 0;
 }
 
+namespace {
+
+// Octets of the validity period an SMS-SUBMIT carries, by the first octet's format bits:
+// none, enhanced (7), relative (1) or absolute (7).
+int ValidityOctets(int firstOctet) {
+    static constexpr int kOctets[4] = {0, 7, 1, 7};
+    return kOctets[(firstOctet >> 3) & 3];
+}
+
+// The user-data header's concatenation element (8- or 16-bit reference), if it has one.
+void ReadPartHeader(const char* header, const char* headerEnd, SmsPartInfo* part) {
+    for (const char* p = header; p + 4 <= headerEnd;) {
+        const int id = HexToInt(p, headerEnd, 2);
+        const int size = HexToInt(p + 2, headerEnd, 2);
+        if (id < 0 || size < 0 || p + 4 + size * 2 > headerEnd) return;
+        const char* data = p + 4;
+        if (id == 0x00 && size == 3) {
+            *part = {HexToInt(data, headerEnd, 2), HexToInt(data + 2, headerEnd, 2),
+                     HexToInt(data + 4, headerEnd, 2)};
+        } else if (id == 0x08 && size == 4) {
+            *part = {HexToInt(data, headerEnd, 4), HexToInt(data + 4, headerEnd, 2),
+                     HexToInt(data + 6, headerEnd, 2)};
+        }
+        p = data + size * 2;
+    }
+}
+
+}  // namespace
+
+// Everything behind the originator: PID, DCS, time stamp or validity period, user data.
+int ParseAfterAddress(const char* pdu, const char* pduEnd, long at, int firstOctet, int stat,
+                      SmsRecord* record) {
+    auto octet = [&](long position) {
+        return position < 0 || position > pduEnd - pdu ? -1 : HexToInt(pdu + position, pduEnd, 2);
+    };
+    const int coding = octet(at + 2);  // behind the protocol identifier
+    if (coding < 0) return 0;
+    record->coding = coding;
+    if (stat == 2) {
+        // PID, DCS and the validity period in the format the first octet names.
+        at += 4 + ValidityOctets(firstOctet) * 2L;
+    } else {
+        const long stampAt = at + 4;
+        if (stampAt + 14 > pduEnd - pdu) return 0;
+        const char* s = pdu + stampAt;
+        // Each octet has its two digits swapped: year, month, day, hour, minute, second, zone.
+        std::snprintf(record->date, sizeof record->date, "%c%c:%c%c:%c%c,%c%c/%c%c/20%c%c", s[7],
+                      s[6], s[9], s[8], s[11], s[10], s[5], s[4], s[3], s[2], s[1], s[0]);
+        at += 18;
+    }
+
+    const int userDataLength = octet(at);
+    if (userDataLength < 0) return 0;
+    const char* userData = pdu + at + 2;
+    if (userData > pduEnd) return 0;
+    const int userDataChars = static_cast<int>(pduEnd - userData);
+    const bool septets = coding == 0 || coding == 0xF2;
+    // A PDU shorter than its user-data length says is damaged: rejected, not shown as garbage.
+    const long needed = septets ? (userDataLength * 7L + 7) / 8 : userDataLength;
+    if (userDataChars < needed * 2) return 0;
+    // A user-data header (concatenation, ports) is not text: its octets are passed over.
+    long headerOctets = 0;
+    if (firstOctet & 0x40) {
+        const int headerLength = octet(at + 2);
+        if (headerLength < 0 || headerLength + 1 > needed) return 0;
+        headerOctets = headerLength + 1;
+        SmsPartInfo part{};
+        ReadPartHeader(userData + 2, userData + headerOctets * 2, &part);
+        if (part.total > 1 && part.sequence >= 1) SmsSetPart(record, part);
+    }
+    if (coding == 8) {
+        const int available = static_cast<int>(needed * 2 - headerOctets * 2);
+        const int limit = static_cast<int>(sizeof record->text) - kSmsPartTrailer - 1;
+        const int count = available < limit ? available : limit;
+        std::memcpy(record->text, userData + headerOctets * 2, static_cast<size_t>(count));
+        record->text[count] = '\0';
+        record->length = count;
+    } else if (septets) {
+        char codes[sizeof record->text];
+        const int all = UnpackSeptets(userData, userDataChars, codes, sizeof codes, userDataLength);
+        // The text starts at the first septet boundary behind the header.
+        const int skip = static_cast<int>((headerOctets * 8 + 6) / 7);
+        int count = all > skip ? all - skip : 0;
+        const int limit = static_cast<int>(sizeof record->text) - kSmsPartTrailer - 1;
+        if (count > limit) count = limit;
+        std::memcpy(record->text, codes + skip, static_cast<size_t>(count));
+        record->text[count] = '\0';
+        record->length = count;
+        // The three codes that would otherwise show as blanks or odd marks.
+        for (int i = 0; i < count; ++i) {
+            char& c = record->text[i];
+            if (c == 0x00)
+                c = 0x20;
+            else if (c == 0x02)
+                c = 0x24;
+            else if (c == 0x0E)
+                c = 0x5D;
+        }
+    } else {
+        CopyBounded(record->text, sizeof record->text, "DATA MESSAGE");
+        record->length = 12;
+    }
+    return 1;
+}
+
 int SmsParsePduReply(const char* reply, int length, SmsRecord* record) {
     if (!reply || length <= 0 || !record) return 0;
     const char* end = reply + length;
@@ -214,6 +328,22 @@ int SmsParsePduReply(const char* reply, int length, SmsRecord* record) {
     const long fieldLength = (digits + 1) / 2 * 2L;
     const long fieldAt = at + 4;
     if (fieldAt + fieldLength > pduEnd - pdu) return 0;
+    const size_t numberUsed = strnlen(record->number, sizeof record->number);
+    if ((addressType & 0x70) == 0x50) {
+        // An alphanumeric sender (a bank's or an operator's name): its semi-octets are packed
+        // 7-bit characters, read as the name they spell.
+        char codes[24];
+        const int count = UnpackSeptets(pdu + fieldAt, static_cast<int>(fieldLength), codes,
+                                        sizeof codes, digits * 4 / 7);
+        size_t n = numberUsed;
+        for (int i = 0; i < count && n + 1 < sizeof record->number; ++i) {
+            const int latin = GsmCodeToLatin(static_cast<uint8_t>(codes[i]));
+            record->number[n++] = static_cast<char>(latin > 0 ? latin : '?');
+        }
+        if (n < sizeof record->number) record->number[n] = '\0';
+        at = fieldAt + fieldLength;
+        return ParseAfterAddress(pdu, pduEnd, at, firstOctet, stat, record);
+    }
     char field[34], swapped[34];
     const long copied = fieldLength < 32 ? fieldLength : 32;
     std::memcpy(field, pdu + fieldAt, static_cast<size_t>(copied));
@@ -224,57 +354,11 @@ int SmsParsePduReply(const char* reply, int length, SmsRecord* record) {
         (swapped[swappedLength - 1] == 'F' || swapped[swappedLength - 1] == 'f'))
         swapped[--swappedLength] = '\0';
     // Appended, as the record comes zero-filled; never past the field's end.
-    const size_t numberUsed = strnlen(record->number, sizeof record->number);
     if (numberUsed < sizeof record->number)
         std::snprintf(record->number + numberUsed, sizeof record->number - numberUsed, "%s%s",
                       addressType == 0x91 ? "+" : "", swapped);
     at = fieldAt + fieldLength;
-
-    const int coding = octet(at + 2);  // behind the protocol identifier
-    if (coding < 0) return 0;
-    record->coding = coding;
-    if (stat == 2) {
-        at += 6;  // PID, DCS and a one-octet validity period
-    } else {
-        const long stampAt = at + 4;
-        if (stampAt + 14 > pduEnd - pdu) return 0;
-        const char* s = pdu + stampAt;
-        // Each octet has its two digits swapped: year, month, day, hour, minute, second, zone.
-        std::snprintf(record->date, sizeof record->date, "%c%c:%c%c:%c%c,%c%c/%c%c/20%c%c", s[7],
-                      s[6], s[9], s[8], s[11], s[10], s[5], s[4], s[3], s[2], s[1], s[0]);
-        at += 18;
-    }
-
-    const int userDataLength = octet(at);
-    if (userDataLength < 0) return 0;
-    const char* userData = pdu + at + 2;
-    const int userDataChars = static_cast<int>(pduEnd - userData);
-    if (coding == 8) {
-        const int count = userDataChars < static_cast<int>(sizeof record->text) - 1
-                              ? userDataChars
-                              : static_cast<int>(sizeof record->text) - 1;
-        std::memcpy(record->text, userData, static_cast<size_t>(count));
-        record->text[count] = '\0';
-        record->length = count;
-    } else if (coding == 0 || coding == 0xF2) {
-        const int count = UnpackSeptets(userData, userDataChars, record->text, sizeof record->text,
-                                        userDataLength);
-        record->length = count;
-        // The three codes that would otherwise show as blanks or odd marks.
-        for (int i = 0; i < count; ++i) {
-            char& c = record->text[i];
-            if (c == 0x00)
-                c = 0x20;
-            else if (c == 0x02)
-                c = 0x24;
-            else if (c == 0x0E)
-                c = 0x5D;
-        }
-    } else {
-        CopyBounded(record->text, sizeof record->text, "DATA MESSAGE");
-        record->length = 12;
-    }
-    return 1;
+    return ParseAfterAddress(pdu, pduEnd, at, firstOctet, stat, record);
 }
 
 int SmsParseTextReply(const char* reply, int length, SmsRecord* record) {
@@ -445,6 +529,28 @@ int BuildSubmitPdu(const SmsRecord& record, char* out, size_t outSize) {
         used += packed;
     }
     return used / 2 - 1;
+}
+
+}  // namespace vqm
+
+namespace vqm {
+
+bool SmsPartOf(const SmsRecord& record, SmsPartInfo* part) {
+    const char* t = record.text + sizeof record.text - kSmsPartTrailer;
+    if (t[-1] != '\0' || t[0] != kSmsPartMark) return false;
+    const auto byte = [&](int i) { return static_cast<uint8_t>(t[i]); };
+    *part = {byte(1) | byte(2) << 8, byte(3), byte(4)};
+    return part->total > 1 && part->sequence >= 1;
+}
+
+void SmsSetPart(SmsRecord* record, const SmsPartInfo& part) {
+    char* t = record->text + sizeof record->text - kSmsPartTrailer;
+    t[-1] = '\0';
+    t[0] = kSmsPartMark;
+    t[1] = static_cast<char>(part.reference & 0xFF);
+    t[2] = static_cast<char>((part.reference >> 8) & 0xFF);
+    t[3] = static_cast<char>(part.total);
+    t[4] = static_cast<char>(part.sequence);
 }
 
 }  // namespace vqm

@@ -73,6 +73,23 @@ int SmsSetCharset(Link& link, const char* name);
 int SmsParsePduReply(const char* reply, int length, SmsRecord* record);
 int SmsParseTextReply(const char* reply, int length, SmsRecord* record);
 
+// One part of a concatenated message, from its user-data header. The record keeps it in the last
+// bytes of its text field, behind the body's terminator, so the 704-byte record stays as it is.
+struct SmsPartInfo {
+    int reference;
+    int total;
+    int sequence;
+};
+inline constexpr int kSmsPartTrailer = 5;
+inline constexpr char kSmsPartMark = 0x1F;
+bool SmsPartOf(const SmsRecord& record, SmsPartInfo* part);
+void SmsSetPart(SmsRecord* record, const SmsPartInfo& part);
+
+// Everything of a PDU behind the originator address, for the read. at is the position of the
+// protocol identifier in hexadecimal characters.
+int ParseAfterAddress(const char* pdu, const char* pduEnd, long at, int firstOctet, int stat,
+                      SmsRecord* record);
+
 // Drops one leading '+', takes at most 32 characters, pads an odd count with 'F' and swaps
 // each pair, NUL-terminated. Returns the count of real digits (the written length less the
 // pad). Swapping back a field read from a PDU is the same call.

@@ -2,6 +2,8 @@
 
 #include <algorithm>
 #include <cstring>
+#include <map>
+#include <tuple>
 
 #include "link/link.h"
 #include "support/gsm.h"
@@ -36,6 +38,12 @@ int LocalPage(const SmsRecord& record) {
     return -1;
 }
 
+std::u16string OneLine(std::u16string text) {
+    std::replace(text.begin(), text.end(), u'\r', u' ');
+    std::replace(text.begin(), text.end(), u'\n', u' ');
+    return text;
+}
+
 std::u16string Wide(const char* narrow, size_t size) {
     char16_t wide[64];
     const int count = NarrowToWide(narrow, wide, static_cast<int>(strnlen(narrow, size)), 64);
@@ -48,9 +56,55 @@ FolderRow MakeRow(int folder, const SmsRecord& record, const NameLookup& names) 
     row.record = record;
     row.from = names && record.number[0] ? names(record.number) : std::u16string();
     if (row.from.empty()) row.from = Wide(record.number, sizeof record.number);
-    row.preview = MessagePreviewText(record);
+    row.body = MessageBodyText(record);
+    row.preview = OneLine(row.body);
     row.date = Wide(record.date, sizeof record.date);
+    row.parts = {record.index};
     return row;
+}
+
+// The parts of one concatenated message (same page, sender, reference and count) as one row,
+// in part order, with a note where a part has not arrived.
+void JoinParts(std::vector<FolderRow>& rows) {
+    struct Key {
+        std::string number;
+        int reference, total;
+        bool operator<(const Key& o) const {
+            return std::tie(number, reference, total) < std::tie(o.number, o.reference, o.total);
+        }
+    };
+    std::map<Key, std::map<int, FolderRow>> groups;
+    std::vector<FolderRow> joined;
+    for (FolderRow& row : rows) {
+        SmsPartInfo part{};
+        if (!SmsPartOf(row.record, &part) || part.sequence > part.total) {
+            joined.push_back(std::move(row));
+            continue;
+        }
+        auto& group = groups[{row.record.number, part.reference, part.total}];
+        group.emplace(part.sequence, std::move(row));
+    }
+    for (auto& [key, parts] : groups) {
+        FolderRow row = parts.begin()->second;
+        row.body.clear();
+        row.parts.clear();
+        row.unread = false;
+        for (int sequence = 1; sequence <= key.total; ++sequence) {
+            const auto found = parts.find(sequence);
+            if (found == parts.end()) {
+                char note[48];
+                std::snprintf(note, sizeof note, "(part %d of %d missing)", sequence, key.total);
+                row.body += Utf8ToUtf16(note);
+                continue;
+            }
+            row.body += found->second.body;
+            row.parts.push_back(found->second.record.index);
+            row.unread = row.unread || found->second.unread;
+        }
+        row.preview = OneLine(row.body);
+        joined.push_back(std::move(row));
+    }
+    rows = std::move(joined);
 }
 
 // Newest first; messages without a date (drafts, unsent ones) after them, by index.
@@ -114,10 +168,7 @@ std::u16string MessageBodyText(const SmsRecord& record) {
 }
 
 std::u16string MessagePreviewText(const SmsRecord& record) {
-    std::u16string text = MessageBodyText(record);
-    std::replace(text.begin(), text.end(), u'\r', u' ');
-    std::replace(text.begin(), text.end(), u'\n', u' ');
-    return text;
+    return OneLine(MessageBodyText(record));
 }
 
 bool FillFolderPages(MessageStore& store, const NameLookup& names,
@@ -140,11 +191,13 @@ bool FillFolderPages(MessageStore& store, const NameLookup& names,
         FolderRow row = MakeRow(kFolderSim, record, names);
         row.unread = StatusIs(record, "REC UNREAD") || isNew ||
                      IndexListContains(settings, kUnreadIdx, record.index) == 1;
-        if (row.unread) {
-            ++listing->unread[page];
-            IndexListAdd(settings, kUnreadIdx, record.index);
-        }
+        if (row.unread) IndexListAdd(settings, kUnreadIdx, record.index);
         listing->pages[page].push_back(std::move(row));
+    }
+    for (int page : {kPageInbox, kPageOutbox, kPageSent}) {
+        JoinParts(listing->pages[page]);
+        for (const FolderRow& row : listing->pages[page])
+            listing->unread[page] += row.unread ? 1 : 0;
     }
 
     StoreReadAll(store, kFolderLocal, &records);
@@ -215,14 +268,19 @@ int DeleteMessages(MessageStore& store, Link& link, const std::vector<FolderRow>
     Begin(ui);
     int result = 1;
     for (const FolderRow& row : rows) {
-        const int index = row.record.index;
         bool ok = true;
-        if (row.folder == kFolderSim) {
-            IndexListRemove(store.settings, kUnreadIdx, index);
-            ok = SmsDelete(link, index) == 0;
-            if (ok && simFullCleared) simFullCleared();
+        // A concatenated message goes with all its parts.
+        const std::vector<int> indices = row.parts.empty() ? std::vector<int>{row.record.index}
+                                                           : row.parts;
+        for (int index : indices) {
+            if (row.folder == kFolderSim) {
+                IndexListRemove(store.settings, kUnreadIdx, index);
+                ok = SmsDelete(link, index) == 0;
+                if (ok && simFullCleared) simFullCleared();
+            }
+            ok = ok && StoreDelete(store, row.folder, index) == 1;
+            if (!ok) break;
         }
-        ok = ok && StoreDelete(store, row.folder, index) == 1;
         if (!ok) {
             Box(ui, u"Cannot delete message.", u"Error!");
             result = 0;
@@ -235,8 +293,11 @@ int DeleteMessages(MessageStore& store, Link& link, const std::vector<FolderRow>
 
 int OpenMessage(MessageStore& store, const FolderRow& row) {
     if (row.folder != kFolderSim || !row.unread) return 0;
-    const int changed = StoreSetStatus(store, kFolderSim, row.record.index, "REC READ");
-    IndexListRemove(store.settings, kUnreadIdx, row.record.index);
+    int changed = 1;
+    for (int index : row.parts.empty() ? std::vector<int>{row.record.index} : row.parts) {
+        changed = StoreSetStatus(store, kFolderSim, index, "REC READ") && changed;
+        IndexListRemove(store.settings, kUnreadIdx, index);
+    }
     return changed;
 }
 

@@ -24,8 +24,11 @@ struct FolderRow {
     SmsRecord record{};
     bool unread = false;
     std::u16string from;     // the sender's (or recipient's) name when known, else the number
+    std::u16string body;     // the whole text; a concatenated message's parts in order
     std::u16string preview;  // the body on one line
     std::u16string date;
+    // The locations this row stands for: one, or every part of a concatenated message.
+    std::vector<int> parts;
 };
 
 struct FolderListing {

@@ -274,7 +274,7 @@ void SmsFolderView::ShowSelected(int page) {
         pane->clear();
         return;
     }
-    pane->setPlainText(Q(MessageBodyText(row->record)));
+    pane->setPlainText(Q(row->body));
     if (context_.uiLog && context_.uiLog->Enabled())
         context_.uiLog->Line("sms-shown", std::u16string(PageTitle(page)) + u": " + row->from +
                                               u" | " + row->preview +
@@ -354,7 +354,7 @@ void SmsFolderView::Reply() {
 void SmsFolderView::Forward() {
     const FolderRow* row = CurrentRow(pages_.current);
     if (!row) return;
-    handoff_.Hand({{}, MessageBodyText(row->record)});
+    handoff_.Hand({{}, row->body});
     if (hooks_.showWriteView) hooks_.showWriteView();
 }
 

@@ -169,11 +169,19 @@ TEST_F(MessageMemoryTest, DeliveryChoosesTheAlphabet) {
     EXPECT_EQ(ucs2.substr(32), "0A03A903BC03AD03B303B1");
 
     EXPECT_EQ(memory_->Control("deliver", "+4412 " + std::string(160, 'a')), "OK");
-    EXPECT_NE(memory_->Control("deliver", "+4412 " + std::string(161, 'a')), "OK");
+    EXPECT_EQ(memory_->Messages().size(), 3u);
+    // Longer texts arrive in parts behind a concatenation header (first octet 0x44).
+    EXPECT_EQ(memory_->Control("deliver", "+4412 " + std::string(161, 'a')), "OK");
     std::string greek;
     for (int i = 0; i < 71; ++i)
         greek += "ω";
-    EXPECT_NE(memory_->Control("deliver", "+4412 " + greek), "OK");
+    EXPECT_EQ(memory_->Control("deliver", "+4412 " + greek), "OK");
+    ASSERT_EQ(memory_->Messages().size(), 7u);
+    EXPECT_EQ(memory_->Messages().at(4).pdu.substr(2, 2), "44");
+    EXPECT_EQ(memory_->Messages().at(7).pdu.substr(32, 12), "050003020202");
+    // A sender's name instead of a number: type 0xD0.
+    EXPECT_EQ(memory_->Control("deliver", "MyBank hello"), "OK");
+    EXPECT_EQ(memory_->Messages().at(8).pdu.substr(4, 4), "0BD0");
     EXPECT_NE(memory_->Control("deliver", "not-a-number hello"), "OK");
     EXPECT_NE(memory_->Control("deliver-pdu", kSubmit), "OK");
     EXPECT_EQ(memory_->Control("ring", "+4412"), "");  // not this group's

@@ -16,6 +16,7 @@
 
 #include "cardsim/card_sim.h"
 #include "link/link.h"
+#include "messaging/sms_folder.h"
 #include "support/settings_store.h"
 #include "support/text.h"
 #include "tests/common/temp_folder.h"
@@ -447,6 +448,52 @@ TEST_F(MessageStoreCardTest, NewMessageIsNotedThenTakenInThroughTheTransferFile)
     calls.clear();
     EXPECT_EQ(SmsIntakeNew(store_, link_), 0);
     EXPECT_EQ(calls, (std::vector<std::string>{"busy", "idle"}));
+}
+
+TEST_F(MessageStoreCardTest, ConcatenatedPartsListAsOneMessageAndGoTogether) {
+    // 3 parts of 153 septets; a named sender; a part that never came (deleted on the SIM).
+    std::string text;
+    for (int i = 0; text.size() < 400; ++i)
+        text += "word" + std::to_string(i) + " ";
+    ASSERT_EQ(sim_->Control("deliver +447700900777 " + text), "OK");
+    ASSERT_EQ(sim_->Control("deliver MyBank Your code is 1234"), "OK");
+    ASSERT_EQ(sim_->Control("deliver +447700900888 " + text), "OK");
+    ASSERT_EQ(SmsDelete(link_, 10), 0);  // the second message's middle part
+    ASSERT_TRUE(Refresh());
+
+    FolderListing listing;
+    ASSERT_TRUE(FillFolderPages(store_, {}, {}, &listing));
+    const std::vector<FolderRow>& inbox = listing.pages[kPageInbox];
+    ASSERT_EQ(inbox.size(), 3u + 3u);  // the demo's three, the two long ones and the bank's
+    const FolderRow* whole = nullptr;
+    const FolderRow* gap = nullptr;
+    const FolderRow* bank = nullptr;
+    for (const FolderRow& row : inbox) {
+        if (row.from == u"+447700900777") whole = &row;
+        if (row.from == u"+447700900888") gap = &row;
+        if (row.from == u"MyBank") bank = &row;
+    }
+    ASSERT_TRUE(whole && gap && bank);
+    EXPECT_EQ(Utf16ToUtf8(whole->body), text.substr(0, text.find_last_not_of(' ') + 1) + " ");
+    EXPECT_EQ(whole->parts, (std::vector<int>{5, 6, 7}));
+    EXPECT_EQ(Utf16ToUtf8(gap->body),
+              text.substr(0, 153) + "(part 2 of 3 missing)" + text.substr(306));
+    EXPECT_EQ(bank->body, u"Your code is 1234");
+    EXPECT_EQ(listing.unread[kPageInbox], 1 + 3);
+
+    // Deleting the message deletes every part, on the SIM and in the cache.
+    FolderUi ui;
+    std::vector<std::u16string> boxes;
+    ui.box = [&](const std::u16string& t, const std::u16string&) { boxes.push_back(t); };
+    ASSERT_EQ(DeleteMessages(store_, link_, {*whole}, ui, {}), 1);
+    EXPECT_TRUE(boxes.empty());
+    for (int location : {5, 6, 7}) {
+        SmsRecord gone{};
+        gone.index = location;
+        EXPECT_EQ(SmsRead(link_, kSmsModePdu, &gone), 0) << location;
+    }
+    ASSERT_TRUE(FillFolderPages(store_, {}, {}, &listing));
+    EXPECT_EQ(listing.pages[kPageInbox].size(), 5u);
 }
 
 }  // namespace

@@ -221,7 +221,7 @@ std::vector<ReadCase> ReadCases() {
                "0000" +
                    stamp + "00"),
          1, "+4412", "REC READ", "14:25:36,11/03/2002", 0, ""},
-        {"odd hexadecimal user data unpacks only whole octets",
+        {"a half octet short of the user-data length is rejected",
          Reply(1,
                "00"
                "04"
@@ -229,8 +229,8 @@ std::vector<ReadCase> ReadCases() {
                "4421"
                "0000" +
                    stamp + "05E8329BFD0"),
-         1, "+4412", "REC READ", "14:25:36,11/03/2002", 0, "hell"},
-        {"a user-data length beyond the data takes what is there",
+         0, "+4412", "REC READ", "14:25:36,11/03/2002", 0, ""},
+        {"a user-data length beyond the data is rejected",
          Reply(1,
                "00"
                "04"
@@ -238,7 +238,50 @@ std::vector<ReadCase> ReadCases() {
                "4421"
                "0000" +
                    stamp + "A0C834"),
+         0, "+4412", "REC READ", "14:25:36,11/03/2002", 0, ""},
+        {"11 septets announced, 10 present",
+         "\r\n+CMGR: 1,,36\r\n07912143658709F1040B918100551512F20000111010214365000BE8329BFD4697"
+         "D9EC37\r\n\r\nOK\r\n",
+         0, "+18005551212", "REC READ", "12:34:56,01/01/2011", 0, ""},
+        {"user data behind a concatenation header",
+         Reply(1,
+               "00"
+               "44"
+               "0491"
+               "4421"
+               "0000" +
+                   stamp + "09050003A70201" "9069"),
          1, "+4412", "REC READ", "14:25:36,11/03/2002", 0, "Hi"},
+        {"UCS2 behind a 16-bit concatenation header",
+         Reply(1,
+               "00"
+               "44"
+               "0491"
+               "4421"
+               "0008" +
+                   stamp + "0906080401F40302" "0041"),
+         1, "+4412", "REC READ", "14:25:36,11/03/2002", 8, "0041"},
+        // A stored message's validity period in each format its first octet can name.
+        {"stored, no validity period", Reply(2, "00" "01" "00" "0491" "4421" "0000" "02C834"), 1,
+         "+4412", "STO UNSENT", "", 0, "Hi"},
+        {"stored, relative validity period",
+         Reply(2, "00" "11" "00" "0491" "4421" "0000" "A7" "02C834"), 1, "+4412", "STO UNSENT",
+         "", 0, "Hi"},
+        {"stored, enhanced validity period",
+         Reply(2, "00" "09" "00" "0491" "4421" "0000" "01000000000000" "02C834"), 1, "+4412",
+         "STO UNSENT", "", 0, "Hi"},
+        {"stored, absolute validity period",
+         Reply(2, "00" "19" "00" "0491" "4421" "0000" "20301141526300" "02C834"), 1, "+4412",
+         "STO UNSENT", "", 0, "Hi"},
+        {"an alphanumeric sender spells its name",
+         Reply(1,
+               "00"
+               "04"
+               "07D0"
+               "C2B07B0D"
+               "0000" +
+                   stamp + "02C834"),
+         1, "Bank", "REC READ", "14:25:36,11/03/2002", 0, "Hi"},
         // Failures: the fields read before the failure stay.
         {"no +CMGR: line", "\r\n+CMS ERROR: 321\r\n", 0, "", "", "", 0, ""},
         {"a named alpha field is not read", "\r\n+CMGR: 1,\"Ann\",20\r\n0004\r\n", 0, "",
@@ -293,6 +336,40 @@ TEST(ReadPdu, HandBuiltReplies) {
     }
 }
 
+TEST(ReadPdu, ConcatenationHeaderMarksThePart) {
+    const std::string stamp = "20301141526300";
+    struct Case {
+        std::string userData;
+        SmsPartInfo part;
+    };
+    const Case cases[] = {
+        {"09050003A70201" "9069", {0xA7, 2, 1}},
+        {"0906080401F40302" "0041", {0x1F4, 3, 2}},
+    };
+    for (const Case& c : cases) {
+        SmsRecord record{};
+        const bool wide = c.part.reference > 0xFF;
+        ASSERT_EQ(ParsePdu(Reply(1, std::string("00" "44" "0491" "4421" "00") +
+                                        (wide ? "08" : "00") + stamp + c.userData),
+                           &record),
+                  1);
+        SmsPartInfo part{};
+        ASSERT_TRUE(SmsPartOf(record, &part));
+        EXPECT_EQ(part.reference, c.part.reference);
+        EXPECT_EQ(part.total, c.part.total);
+        EXPECT_EQ(part.sequence, c.part.sequence);
+    }
+    // A header without a concatenation element (a port number) marks nothing.
+    SmsRecord ported{};
+    ASSERT_EQ(
+        ParsePdu(Reply(1, "00" "44" "0491" "4421" "0000" + stamp + "0A" "060504" "0B8423F0" "C834"),
+                 &ported),
+        1);
+    EXPECT_STREQ(ported.text, "Hi");
+    SmsPartInfo part{};
+    EXPECT_FALSE(SmsPartOf(ported, &part));
+}
+
 TEST(ReadPdu, StaysInsideTheRecordOnOversizedFields) {
     // Twenty international digits: the field keeps "+" and 18 of them and its NUL.
     SmsRecord record{};
@@ -322,8 +399,9 @@ TEST(ReadPdu, StaysInsideTheRecordOnOversizedFields) {
                                  data),
                        &wide),
               1);
-    EXPECT_EQ(wide.length, 639);
-    EXPECT_EQ(wide.text[639], '\0');
+    // Only the 140 octets the user-data length announces are the body.
+    EXPECT_EQ(wide.length, 280);
+    EXPECT_EQ(wide.text[280], '\0');
     // The number is appended to what the record holds, never past its field.
     SmsRecord dirty{};
     std::memset(dirty.number, '9', sizeof dirty.number);
