@@ -104,13 +104,13 @@ const EbookApi& Ebook() {
         void* glib = dlopen("libglib-2.0.so.0", RTLD_NOW | RTLD_GLOBAL);
         if (!handle || !glib) return;
         // libedataserver comes with libebook; dlsym on the handle searches its dependencies.
-        api.loaded = Look(handle, "e_source_registry_new_sync", api.registryNewSync) &&
-                     Look(handle, "e_source_registry_ref_default_address_book",
-                          api.refDefaultAddressBook) &&
-                     Look(handle, "e_book_client_connect_sync", api.connectSync) &&
-                     Look(handle, "e_book_client_get_contacts_sync", api.getContactsSync) &&
-                     Look(glib, "g_slist_free_full", api.slistFreeFull) &&
-                     Look(glib, "g_error_free", api.errorFree);
+        api.loaded =
+            Look(handle, "e_source_registry_new_sync", api.registryNewSync) &&
+            Look(handle, "e_source_registry_ref_default_address_book", api.refDefaultAddressBook) &&
+            Look(handle, "e_book_client_connect_sync", api.connectSync) &&
+            Look(handle, "e_book_client_get_contacts_sync", api.getContactsSync) &&
+            Look(glib, "g_slist_free_full", api.slistFreeFull) &&
+            Look(glib, "g_error_free", api.errorFree);
     });
     return api;
 }
@@ -141,7 +141,8 @@ AddressBookContact FromEContact(const VCardApi& api, void* contact) {
 
 std::string Trimmed(const std::string& line) {
     size_t begin = 0, end = line.size();
-    while (begin < end && (line[begin] == ' ' || line[begin] == '\t')) ++begin;
+    while (begin < end && (line[begin] == ' ' || line[begin] == '\t'))
+        ++begin;
     while (end > begin && (line[end - 1] == '\r' || line[end - 1] == ' ' || line[end - 1] == '\t'))
         --end;
     std::string out = line.substr(begin, end - begin);
@@ -252,16 +253,17 @@ AddressBookResult ReadEdsAddressBook() {
         return result;
     }
     void* source = api.refDefaultAddressBook(registry);
-    void* client = source ? api.connectSync(source, 10, nullptr, &error) : nullptr;
+    // A local address book never reports itself "connected", so the connect waits out its
+    // limit whatever it is (0 waits for good): one second, after which it is ready anyway.
+    void* client = source ? api.connectSync(source, 1, nullptr, &error) : nullptr;
     if (error) {
         api.errorFree(error);
         error = nullptr;
     }
     GSList* list = nullptr;
     // EDS's query for every contact.
-    if (client &&
-        api.getContactsSync(client, "(contains \"x-evolution-any-field\" \"\")", &list, nullptr,
-                            &error)) {
+    if (client && api.getContactsSync(client, "(contains \"x-evolution-any-field\" \"\")", &list,
+                                      nullptr, &error)) {
         result.opened = true;
         result.source = AddressBookSource::Eds;
         for (GSList* item = list; item; item = item->next)
@@ -297,8 +299,8 @@ std::string PhonebookToVCards(const std::vector<PhonebookEntry>& entries,
         if (entry.numberLength <= 0) continue;
         char16_t name[kPhonebookTextSize + 1];
         char16_t number[kPhonebookNumberSize + 1];
-        NarrowToWide(entry.text, name,
-                     std::clamp<int>(entry.textLength, 0, kPhonebookTextSize), sizeof name / 2);
+        NarrowToWide(entry.text, name, std::clamp<int>(entry.textLength, 0, kPhonebookTextSize),
+                     sizeof name / 2);
         NarrowToWide(entry.number, number,
                      std::clamp<int>(entry.numberLength, 0, kPhonebookNumberSize),
                      sizeof number / 2);
@@ -322,9 +324,8 @@ std::string PhonebookToVCards(const std::vector<PhonebookEntry>& entries,
 std::vector<VCardImportEntry> VCardsToPhonebook(const AddressBookResult& cards) {
     std::vector<VCardImportEntry> out;
     for (const AddressBookContact& c : cards.contacts) {
-        for (const std::u16string* number :
-             {&c.mobile, &c.home, &c.business, &c.home2, &c.business2, &c.homeFax,
-              &c.businessFax}) {
+        for (const std::u16string* number : {&c.mobile, &c.home, &c.business, &c.home2,
+                                             &c.business2, &c.homeFax, &c.businessFax}) {
             if (number->empty()) continue;
             out.push_back({c.fileAs, *number});
             break;

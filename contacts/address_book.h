@@ -31,9 +31,9 @@ struct AddressBookContact {
 enum class AddressBookSource { None, Eds, VCardFolder };
 
 struct AddressBookResult {
-    bool opened = false;           // the source could be read (an empty one counts)
+    bool opened = false;  // the source could be read (an empty one counts)
     AddressBookSource source = AddressBookSource::None;
-    std::string missingLibrary;    // set when the vCard library itself cannot be loaded
+    std::string missingLibrary;  // set when the vCard library itself cannot be loaded
     std::vector<AddressBookContact> contacts;
 };
 

@@ -52,8 +52,7 @@ OutlookRecords MakeOutlookRecords(const AddressBookContact& contact) {
     std::memcpy(r.work.name, r.mobile.name, kOutlookNameSize);
     r.mobileLength = NumberField(contact.mobile, r.mobile.number);
     const std::u16string* home[3] = {&contact.home, &contact.home2, &contact.homeFax};
-    const std::u16string* work[3] = {&contact.business, &contact.business2,
-                                     &contact.businessFax};
+    const std::u16string* work[3] = {&contact.business, &contact.business2, &contact.businessFax};
     for (int i = 0; i < 3; ++i) {
         r.homeLengths[i] = NumberField(*home[i], r.home.numbers[i]);
         r.workLengths[i] = NumberField(*work[i], r.work.numbers[i]);

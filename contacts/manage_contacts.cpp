@@ -35,8 +35,8 @@ std::u16string NonEnglishMessage(const std::u16string& name) {
         if (ch < 0x20 || ch == 0x7F)
             message += u"\n" + Ascii(code) + u" cannot be stored.";
         else
-            message += u"\n\"" + std::u16string(1, ch) + u"\" (" + Ascii(code) +
-                       u") cannot be stored.";
+            message +=
+                u"\n\"" + std::u16string(1, ch) + u"\" (" + Ascii(code) + u") cannot be stored.";
         break;
     }
     return message;
@@ -50,8 +50,8 @@ ContactCheckResult CheckContact(const std::u16string& nameTyped, const std::u16s
     if (name.empty()) return result;
     // The card's own form of the name is what has to be plain: 8-bit, its bytes counted.
     char narrow[kFieldChars + 1];
-    const int bytes = WideToNarrow(name.c_str(), narrow, static_cast<int>(name.size()),
-                                   sizeof narrow);
+    const int bytes =
+        WideToNarrow(name.c_str(), narrow, static_cast<int>(name.size()), sizeof narrow);
     bool english = IsEnglishText(narrow, static_cast<size_t>(bytes)) != 0;
     // A character with no 8-bit form became '?' above; it is no more English than before.
     english = english && IsEnglishText(name.c_str(), name.size() * 2);
@@ -70,8 +70,7 @@ ContactCheckResult CheckContact(const std::u16string& nameTyped, const std::u16s
     }
     if (number.empty()) return result;
     if (static_cast<int64_t>(number.size()) > numberLimit) {
-        std::snprintf(text, sizeof text, "Contact number cannot more than %d digits.",
-                      numberLimit);
+        std::snprintf(text, sizeof text, "Contact number cannot more than %d digits.", numberLimit);
         result.check = ContactCheck::Refused;
         result.message = Ascii(text);
         return result;
@@ -99,8 +98,7 @@ bool FindMatches(const std::u16string& nameRow, const std::u16string& searchText
     return search.find(name) != std::u16string::npos;
 }
 
-int FindNext(const std::vector<std::u16string>& names, const std::u16string& search,
-             int lastHit) {
+int FindNext(const std::vector<std::u16string>& names, const std::u16string& search, int lastHit) {
     const int count = static_cast<int>(names.size());
     const int start = lastHit >= 0 && lastHit < count ? lastHit + 1 : 0;
     for (int i = start; i < count; ++i)

@@ -84,8 +84,8 @@ PhonebookEntry MakeEntry(int index, const std::u16string& name, const std::u16st
     std::memset(&entry, 0, sizeof entry);
     entry.index = index;
     entry.type = NumberType(number);
-    entry.numberLength = WideToNarrow(number.c_str(), entry.number,
-                                      static_cast<int>(number.size()), sizeof entry.number);
+    entry.numberLength = WideToNarrow(number.c_str(), entry.number, static_cast<int>(number.size()),
+                                      sizeof entry.number);
     entry.textLength =
         WideToNarrow(name.c_str(), entry.text, static_cast<int>(name.size()), sizeof entry.text);
     return entry;
@@ -363,8 +363,7 @@ long ManageContactsView::OnMessage(unsigned msg, long, long) {
             int32_t refreshSim = 0, refreshOutlook = 0;
             GetSettingInt(context_.settings, u"GeneralRefreshSim", &refreshSim);
             GetSettingInt(context_.settings, u"GeneralRefreshOutlook", &refreshOutlook);
-            Do(ContactsCardStateChanged(state_, cardState_(), current, refreshSim,
-                                        refreshOutlook));
+            Do(ContactsCardStateChanged(state_, cardState_(), current, refreshSim, refreshOutlook));
             break;
         }
         case kMsgOutlookCacheBuilt:
@@ -592,8 +591,8 @@ int ManageContactsView::Box(const std::u16string& text) {
 
 bool ManageContactsView::RunContactDialog(ContactDialog& dialog, const StorageLimits& limits) {
     auto verdict = [&dialog, &limits] {
-        return CheckContact(U(dialog.Name()->text()), U(dialog.Number()->text()),
-                            limits.textLength, limits.numberLength);
+        return CheckContact(U(dialog.Name()->text()), U(dialog.Number()->text()), limits.textLength,
+                            limits.numberLength);
     };
     bool checkedByOk = false;
     dialog.check = [&] {
@@ -810,8 +809,7 @@ void ManageContactsView::Find() {
 
 int HandRecipientsToWriteSms(ShellContext& context, const std::u16string& recipients) {
     if (!context.mainWindow) return 0;
-    auto* receiver =
-        dynamic_cast<RecipientsReceiver*>(context.mainWindow->ViewAt(kViewWriteSms));
+    auto* receiver = dynamic_cast<RecipientsReceiver*>(context.mainWindow->ViewAt(kViewWriteSms));
     if (!receiver) return 0;
     receiver->AppendRecipients(recipients);
     context.mainWindow->Command(kCmdViewFirst + kViewWriteSms);

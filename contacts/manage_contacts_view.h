@@ -43,8 +43,8 @@ inline constexpr int kContactReasonId = 1203, kContactOldNameId = 1204, kContact
 inline constexpr int kContactsSimPage = 0, kContactsCardPage = 1, kContactsMobilePage = 2,
                      kContactsHomePage = 3, kContactsWorkPage = 4, kContactsPageCount = 5;
 // Columns: what is shown, and the storage code and index the commands work from.
-inline constexpr int kContactsColumnName = 0, kContactsColumnPhone = 1,
-                     kContactsColumnStorage = 2, kContactsColumnIndex = 3;
+inline constexpr int kContactsColumnName = 0, kContactsColumnPhone = 1, kContactsColumnStorage = 2,
+                     kContactsColumnIndex = 3;
 
 // Menu commands.
 inline constexpr int kCmdContactNew = 40021, kCmdContactEdit = 40015, kCmdContactCall = 40019,

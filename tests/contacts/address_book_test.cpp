@@ -103,8 +103,7 @@ TEST_F(AddressBookTest, TheFolderSettingAndTheDefaultFolder) {
     // A named folder is read instead of EDS.
     std::filesystem::create_directories(temp_ / "mine");
     WriteFile("mine/x.vcf", kTwoCards);
-    SetSettingString(settings, kContactsFolderSetting,
-                     Utf8ToUtf16(temp_ / "mine").c_str());
+    SetSettingString(settings, kContactsFolderSetting, Utf8ToUtf16(temp_ / "mine").c_str());
     const AddressBookResult book = ReadDesktopAddressBook(settings);
     EXPECT_EQ(book.source, AddressBookSource::VCardFolder);
     EXPECT_EQ(book.contacts.size(), 2u);
@@ -121,7 +120,7 @@ TEST_F(AddressBookTest, PhonebookEntriesOutToVCardsAndBack) {
         e.textLength = static_cast<int32_t>(std::strlen(text));
     };
     fill(entries[0], 1, "+491715550101", "Anna");
-    fill(entries[1], 2, "", "Empty slot");  // no number: not exported
+    fill(entries[1], 2, "", "Empty slot");         // no number: not exported
     fill(entries[2], 7, "0305550102", "Caf\xE9");  // ISO 8859-1 on the card
     const std::string text = PhonebookToVCards(entries);
     EXPECT_NE(text.find("BEGIN:VCARD"), std::string::npos);

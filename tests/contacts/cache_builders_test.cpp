@@ -243,10 +243,9 @@ TEST_F(CacheBuildersTest, RunsOfTenUpToTheTotalUntilTheUsedCountIsRead) {
     SimCacheBuild(caches_, *link_, Notifier());
     const Commands sent = Sent();
     // SM: 1-10 empty, 11-20 one, 21-25 the second; ME answers the same usage and stops early.
-    const Commands expected{"AT+CPBS=\"SM\"",  "AT+CPBS?",      "AT+CPBR=1,10",
-                            "AT+CPBR=11,20",   "AT+CPBR=21,25", "AT+CPBS=\"ME\"",
-                            "AT+CPBS?",        "AT+CPBR=1,10",  "AT+CPBR=11,20",
-                            "AT+CPBR=21,25"};
+    const Commands expected{"AT+CPBS=\"SM\"", "AT+CPBS?",       "AT+CPBR=1,10", "AT+CPBR=11,20",
+                            "AT+CPBR=21,25",  "AT+CPBS=\"ME\"", "AT+CPBS?",     "AT+CPBR=1,10",
+                            "AT+CPBR=11,20",  "AT+CPBR=21,25"};
     EXPECT_EQ(sent, expected);
     EXPECT_EQ(SimFile(1).size(), 2u);
     EXPECT_EQ(SimFile(2).size(), 2u);
@@ -299,8 +298,8 @@ TEST_F(CacheBuildersTest, APresentCacheIsReportedWithoutTheCard) {
         bool built;
     };
     const Case cases[] = {
-        {"", false},                                 // empty but present
-        {std::string(kPhonebookEntrySize, 'x'), false},  // one record
+        {"", false},                                        // empty but present
+        {std::string(kPhonebookEntrySize, 'x'), false},     // one record
         {std::string(kPhonebookEntrySize + 3, 'x'), true},  // damaged: not a cache
     };
     size_t reports = 0;
@@ -402,7 +401,7 @@ TEST_F(CacheBuildersTest, EachContactGoesToTheFilesOfItsNumbers) {
     const auto home = ReadRecords<OutlookNumbersRecord>(CachePath(caches_.outlook, 2));
     const auto work = ReadRecords<OutlookNumbersRecord>(CachePath(caches_.outlook, 3));
     ASSERT_EQ(mobile.size(), 2u);
-    EXPECT_STREQ(mobile[0].number, "+4917155501");  // only what can be dialled
+    EXPECT_STREQ(mobile[0].number, "+4917155501");                    // only what can be dialled
     EXPECT_EQ(strnlen(mobile[1].name, sizeof mobile[1].name), 127u);  // cut to 127 bytes
     ASSERT_EQ(home.size(), 1u);
     EXPECT_STREQ(home[0].numbers[0], "2");
@@ -435,8 +434,8 @@ TEST_F(CacheBuildersTest, AnEmptyOrMissingAddressBookWritesNothing) {
         // A builder of the SIM group does not matter; one of this group would.
         ASSERT_EQ(CacheAcquire(caches_.sim.lock, kCacheWrite), 1);
         OutlookCacheBuild(
-            caches_, [&] { return c.book; },
-            [&](const std::u16string& t) { boxes.push_back(t); }, Notifier());
+            caches_, [&] { return c.book; }, [&](const std::u16string& t) { boxes.push_back(t); },
+            Notifier());
         CacheRelease(caches_.sim.lock);
         EXPECT_EQ(WaitReports(++reports).back(), kOutlookCacheDone);
         EXPECT_EQ(boxes, c.boxes);
@@ -456,10 +455,12 @@ TEST_F(CacheBuildersTest, ClearAndRebuildDeleteAPresentCacheFirst) {
     AddressBookResult book;
     book.opened = true;
     book.contacts = {Contact(u"A", u"1")};
-    OutlookCacheRebuild(caches_, [&] { return book; }, {}, Notifier());
+    OutlookCacheRebuild(
+        caches_, [&] { return book; }, {}, Notifier());
     EXPECT_EQ(WaitReports(2).back(), kOutlookCacheDone);
     caches_.workers.JoinAll();
-    OutlookCacheRebuild(caches_, [&] { return book; }, {}, Notifier());
+    OutlookCacheRebuild(
+        caches_, [&] { return book; }, {}, Notifier());
     WaitReports(3);
     caches_.workers.JoinAll();
     // Rebuilt from nothing, not appended to the first build.

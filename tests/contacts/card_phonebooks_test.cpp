@@ -103,13 +103,12 @@ TEST_F(CardPhonebooksTest, EveryPlaceWritesReadsAndDeletes) {
             ASSERT_EQ(Send("AT+CPBW=" + index + ",\"+" + index + "\",145,\"N" + index + "\""),
                       "\r\nOK\r\n")
                 << book.name << i;
-            ASSERT_EQ(Send("AT+CPBR=" + index),
-                      "\r\n+CPBR: " + index + ",\"+" + index + "\",145,\"N" + index +
-                          "\"\r\n\r\nOK\r\n");
+            ASSERT_EQ(Send("AT+CPBR=" + index), "\r\n+CPBR: " + index + ",\"+" + index +
+                                                    "\",145,\"N" + index + "\"\r\n\r\nOK\r\n");
         }
         const std::string total = std::to_string(book.total);
-        EXPECT_EQ(Send("AT+CPBS?"), "\r\n+CPBS: \"" + std::string(book.name) + "\"," + total +
-                                        "," + total + "\r\n\r\nOK\r\n");
+        EXPECT_EQ(Send("AT+CPBS?"), "\r\n+CPBS: \"" + std::string(book.name) + "\"," + total + "," +
+                                        total + "\r\n\r\nOK\r\n");
         // Full: a write without a place is the card's memory-full error; a named place is
         // overwritten.
         EXPECT_EQ(Send("AT+CPBW=,\"123\",129,\"Extra\""), "\r\nERROR\r\n");
@@ -125,8 +124,8 @@ TEST_F(CardPhonebooksTest, EveryPlaceWritesReadsAndDeletes) {
         // Deleting an empty place is no error; reading an empty range lists nothing.
         EXPECT_EQ(Send("AT+CPBW=5"), "\r\nOK\r\n");
         EXPECT_EQ(Send("AT+CPBR=1," + total), "\r\nOK\r\n");
-        EXPECT_EQ(Send("AT+CPBS?"), "\r\n+CPBS: \"" + std::string(book.name) + "\",0," + total +
-                                        "\r\n\r\nOK\r\n");
+        EXPECT_EQ(Send("AT+CPBS?"),
+                  "\r\n+CPBS: \"" + std::string(book.name) + "\",0," + total + "\r\n\r\nOK\r\n");
         // The first free place is the lowest one.
         Send("AT+CPBW=1,\"1\",129,\"a\"");
         Send("AT+CPBW=3,\"3\",129,\"c\"");

@@ -209,7 +209,8 @@ TEST_F(ManageContactsViewTest, NewEditCopyAndDeleteReachTheCardAndTheLists) {
     Select(kContactsSimPage, "Alice Smith");
     list->topLevelItem(0)->setSelected(true);
     for (int i = 0; i < list->topLevelItemCount(); ++i)
-        if (list->topLevelItem(i)->text(0) == "Zed Edited") list->topLevelItem(i)->setSelected(true);
+        if (list->topLevelItem(i)->text(0) == "Zed Edited")
+            list->topLevelItem(i)->setSelected(true);
     view.Command(kCmdContactDelete);
     EXPECT_EQ(Names(kContactsSimPage).size(), 7u);
     EXPECT_EQ(CardEntry("SM", 9).numberLength, 0);
@@ -257,7 +258,8 @@ TEST_F(ManageContactsViewTest, CopyOffersToCutWhatDoesNotFit) {
     QTreeWidget* list = view.List(kContactsSimPage);
     Select(kContactsSimPage, "Bob Jones");
     for (int i = 0; i < list->topLevelItemCount(); ++i)
-        if (list->topLevelItem(i)->text(0).startsWith("Chlo")) list->topLevelItem(i)->setSelected(true);
+        if (list->topLevelItem(i)->text(0).startsWith("Chlo"))
+            list->topLevelItem(i)->setSelected(true);
     std::vector<std::pair<QString, QString>> offered;  // reason, prefilled name
     answers_.push_back([&](ContactDialog& dialog) {
         offered.emplace_back(qobject_cast<QLabel*>(FindControl(&dialog, kContactReasonId))->text(),
@@ -328,7 +330,8 @@ TEST_F(ManageContactsViewTest, AddressBookPagesFromAVCardFolder) {
     ManageContactsView& view = MakeLoaded();
     view.ShowPage(kContactsMobilePage);
     view.Command(kCmdContactRefresh);
-    ASSERT_TRUE(WaitUntil([&] { return view.LoadState().outlook == 2 && !caches_.workers.Busy(); }));
+    ASSERT_TRUE(
+        WaitUntil([&] { return view.LoadState().outlook == 2 && !caches_.workers.Busy(); }));
     EXPECT_EQ(Names(kContactsMobilePage), std::vector<std::string>{"Greta Holm"});
     EXPECT_EQ(Names(kContactsHomePage), std::vector<std::string>{"Greta Holm"});
     // The fax-only contact is in the work file but not listed: only first numbers are.
@@ -366,7 +369,8 @@ TEST_F(ManageContactsViewTest, ScreenshotOfEachPageAndDialog) {
     ManageContactsView& view = MakeLoaded();
     view.ShowPage(kContactsMobilePage);
     view.Command(kCmdContactRefresh);
-    ASSERT_TRUE(WaitUntil([&] { return view.LoadState().outlook == 2 && !caches_.workers.Busy(); }));
+    ASSERT_TRUE(
+        WaitUntil([&] { return view.LoadState().outlook == 2 && !caches_.workers.Busy(); }));
     fs::create_directories(kShotFolder);
     const char* names[kContactsPageCount] = {"sim.png", "card.png", "mobile.png", "home.png",
                                              "work.png"};

@@ -43,12 +43,11 @@ class ContactsProgramTest : public ::testing::Test {
         card_.Start(Environment() + VQM_CARDSIM + " --powered --state-dir " + (temp_ / "state") +
                     " >" + (temp_ / "cardsim.out") + " 2>&1");
         const std::string run = temp_ / "xdg/VQMFull";
-        ASSERT_TRUE(
-            WaitFor([&] { return ServerAnswers(WindowSocketPath(run, kCompanionClass)); }));
+        ASSERT_TRUE(WaitFor([&] { return ServerAnswers(WindowSocketPath(run, kCompanionClass)); }));
         dialer_.Start(Environment() + VQM_DIALER + " --ui-log " + (temp_ / "ui.log") +
                       " --answer-boxes ok >" + (temp_ / "dialer.out") + " 2>&1");
-        ASSERT_TRUE(WaitFor([&] { return Log().find("card 2 connected") != std::string::npos; },
-                            30s))
+        ASSERT_TRUE(
+            WaitFor([&] { return Log().find("card 2 connected") != std::string::npos; }, 30s))
             << Log();
     }
     std::string Log() const {
