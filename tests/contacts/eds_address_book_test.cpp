@@ -36,7 +36,9 @@ std::string AddToEds(const std::vector<std::string>& cards) {
         dlsym(ebook, "e_book_client_add_contact_sync"));
     auto fromVcard =
         reinterpret_cast<void* (*)(const char*)>(dlsym(ebook, "e_contact_new_from_vcard"));
-    if (!registryNew || !refDefault || !connect || !add || !fromVcard) return "missing symbol";
+    auto unref = reinterpret_cast<void (*)(void*)>(dlsym(ebook, "g_object_unref"));
+    if (!registryNew || !refDefault || !connect || !add || !fromVcard || !unref)
+        return "missing symbol";
     GError* error = nullptr;
     void* registry = registryNew(nullptr, &error);
     if (!registry) return error ? error->message : "no registry";
@@ -44,12 +46,20 @@ std::string AddToEds(const std::vector<std::string>& cards) {
     if (!source) return "no default address book";
     void* client = connect(source, 1, nullptr, &error);
     if (!client) return error ? error->message : "no client";
+    std::string result;
     for (const std::string& card : cards) {
         void* contact = fromVcard(card.c_str());
-        if (!add(client, contact, 0, nullptr, nullptr, &error))
-            return error ? error->message : "add failed";
+        const bool added = add(client, contact, 0, nullptr, nullptr, &error);
+        unref(contact);
+        if (!added) {
+            result = error ? error->message : "add failed";
+            break;
+        }
     }
-    return "";
+    unref(client);
+    unref(source);
+    unref(registry);
+    return result;
 }
 
 TEST(EdsAddressBookTest, ContactsAddedToEdsReachTheCaches) {
