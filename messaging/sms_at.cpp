@@ -274,16 +274,8 @@ int ParseAfterAddress(const char* pdu, const char* pduEnd, long at, int firstOct
         std::memcpy(record->text, codes + skip, static_cast<size_t>(count));
         record->text[count] = '\0';
         record->length = count;
-        // The three codes that would otherwise show as blanks or odd marks.
-        for (int i = 0; i < count; ++i) {
-            char& c = record->text[i];
-            if (c == 0x00)
-                c = 0x20;
-            else if (c == 0x02)
-                c = 0x24;
-            else if (c == 0x0E)
-                c = 0x5D;
-        }
+        for (int i = 0; i < count; ++i)
+            record->text[i] = SmsCodeToText(static_cast<uint8_t>(record->text[i]));
     } else {
         CopyBounded(record->text, sizeof record->text, "DATA MESSAGE");
         record->length = 12;
@@ -551,6 +543,26 @@ void SmsSetPart(SmsRecord* record, const SmsPartInfo& part) {
     t[2] = static_cast<char>((part.reference >> 8) & 0xFF);
     t[3] = static_cast<char>(part.total);
     t[4] = static_cast<char>(part.sequence);
+}
+
+}  // namespace vqm
+
+namespace vqm {
+
+char SmsCodeToText(uint8_t code) {
+    // The three codes that would otherwise show as blanks or odd marks.
+    if (code == 0x00) return 0x20;
+    if (code == 0x02) return 0x24;
+    if (code == 0x0E) return 0x5D;
+    const int latin = GsmCodeToLatin(code);
+    return static_cast<char>(latin >= 0 ? latin : code);
+}
+
+char16_t SmsTextToWide(char byte) {
+    const uint8_t b = static_cast<uint8_t>(byte);
+    if (b == 0x10 || (b >= 0x12 && b <= 0x1A)) return GsmCodeToWide(b);
+    if (b == 0x1B) return u' ';
+    return LatinToWide(byte);
 }
 
 }  // namespace vqm

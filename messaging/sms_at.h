@@ -73,6 +73,13 @@ int SmsSetCharset(Link& link, const char* name);
 int SmsParsePduReply(const char* reply, int length, SmsRecord* record);
 int SmsParseTextReply(const char* reply, int length, SmsRecord* record);
 
+// A 7-bit body as the read keeps it: ISO 8859-1, the form every other 7-bit body of the
+// program has, except that '@', '$' and 'Å' (codes 0x00, 0x02, 0x0E) become ' ', '$' and ']'
+// and the Greek capitals, which ISO 8859-1 lacks, stay as their codes (0x10, 0x12..0x1A), where
+// ISO 8859-1 has only unused control bytes. SmsTextToWide shows such a body.
+char SmsCodeToText(uint8_t code);
+char16_t SmsTextToWide(char byte);
+
 // One part of a concatenated message, from its user-data header. The record keeps it in the last
 // bytes of its text field, behind the body's terminator, so the 704-byte record stays as it is.
 struct SmsPartInfo {

@@ -160,11 +160,10 @@ std::u16string MessageBodyText(const SmsRecord& record) {
         const int units = Ucs2BytesToWide(bytes, count, wide, sizeof wide / sizeof wide[0]);
         return std::u16string(wide, static_cast<size_t>(units));
     }
-    char shown[sizeof record.text + 1];
-    const int count = GsmToDisplay(record.text, length, shown, sizeof shown);
-    char16_t wide[sizeof record.text + 1];
-    const int units = NarrowToWide(shown, wide, count, sizeof wide / sizeof wide[0]);
-    return std::u16string(wide, static_cast<size_t>(units));
+    std::u16string text;
+    for (int i = 0; i < length && record.text[i] != '\0'; ++i)
+        text.push_back(SmsTextToWide(record.text[i]));
+    return text;
 }
 
 std::u16string MessagePreviewText(const SmsRecord& record) {

@@ -179,11 +179,11 @@ std::string GammuEncode(const Generated& m, bool submit, const char* centre) {
     return WirePdu(frame, layout, submit);
 }
 
-// What our read makes of a 7-bit body: the GSM codes, three of them shown differently.
+// What our read makes of a 7-bit body: ISO 8859-1, three codes shown differently.
 std::string ShownCodes(const std::vector<uint8_t>& codes) {
     std::string shown;
     for (uint8_t code : codes)
-        shown.push_back(code == 0x00 ? ' ' : code == 0x02 ? '$' : code == 0x0E ? ']' : code);
+        shown.push_back(SmsCodeToText(code));
     return shown;
 }
 

@@ -7,6 +7,8 @@
 #include <vector>
 
 #include "messaging/sms_at.h"
+#include "messaging/sms_folder.h"
+#include "support/gsm.h"
 
 namespace vqm {
 namespace {
@@ -334,6 +336,37 @@ TEST(ReadPdu, HandBuiltReplies) {
             EXPECT_EQ(record.text[record.length], '\0');
         }
     }
+}
+
+TEST(ReadPdu, EveryCodeOfTheAlphabetShowsAsItselfButTheThreeTheReadReplaces) {
+    std::vector<uint8_t> codes;
+    for (int code = 0; code < 128; ++code)
+        codes.push_back(static_cast<uint8_t>(code));
+    char packed[400];
+    ASSERT_GT(PackGsmCodes(codes.data(), static_cast<int>(codes.size()), packed, sizeof packed), 0);
+    SmsRecord record{};
+    ASSERT_EQ(ParsePdu(Reply(1, std::string("00" "04" "0491" "4421" "0000" "20301141526300") +
+                                    "80" + packed),
+                       &record),
+              1);
+    ASSERT_EQ(record.length, 128);
+    const std::u16string pane = MessageBodyText(record);
+    const std::u16string preview = MessagePreviewText(record);
+    ASSERT_EQ(pane.size(), 128u);
+    ASSERT_EQ(preview.size(), 128u);
+    for (int code = 0; code < 128; ++code) {
+        // '@', '$' and 'Å' are shown as the read replaces them; the escape, which has no
+        // character of its own, as a blank; every other code as the alphabet's character.
+        char16_t expected = GsmCodeToWide(static_cast<uint8_t>(code));
+        if (code == 0x00 || code == 0x1B) expected = u' ';
+        if (code == 0x02) expected = u'$';
+        if (code == 0x0E) expected = u']';
+        EXPECT_EQ(pane[code], expected) << "code " << code;
+        const char16_t onOneLine = expected == u'\n' || expected == u'\r' ? u' ' : expected;
+        EXPECT_EQ(preview[code], onOneLine) << "code " << code;
+    }
+    EXPECT_EQ(pane[0x24], u'\u00A4');  // the currency sign stays itself
+    EXPECT_EQ(pane[0x5D], u'\u00D1');
 }
 
 TEST(ReadPdu, ConcatenationHeaderMarksThePart) {
