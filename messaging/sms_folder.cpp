@@ -114,7 +114,9 @@ void SortNewestFirst(std::vector<FolderRow>& rows) {
         const int bLength = static_cast<int>(strnlen(b.record.date, sizeof b.record.date));
         if ((aLength == 0) != (bLength == 0)) return bLength == 0;
         if (aLength == 0) return a.record.index < b.record.index;
-        return CompareDateTime(1, a.record.date, aLength, b.record.date, bLength) < 0;
+        const int order = CompareDateTime(1, a.record.date, aLength, b.record.date, bLength);
+        // Within one second the later arrival is the one at the higher location.
+        return order != 0 ? order < 0 : a.record.index > b.record.index;
     });
 }
 
