@@ -259,7 +259,10 @@ TEST_F(CacheBuildersTest, APulledCardEndsTheBuildWithWhatWasRead) {
     for (int i = 1; i <= 10; ++i)
         run += "\r\n+CPBR: " + std::to_string(i) + ",\"" + std::to_string(i) + "\",129,\"N\"\r\n";
     Answer("AT+CPBR=1,10", run + "\r\nOK\r\n");
-    pullAt_ = 3;  // select, usage and the first run answer; then the card is silent
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        pullAt_ = 3;  // select, usage and the first run answer; then the card is gone
+    }
     SimCacheBuild(caches_, *link_, Notifier());
     EXPECT_EQ(WaitReports(1), std::vector<unsigned>{kSimCacheDone});
     EXPECT_EQ(SimFile(1).size(), 10u);
