@@ -319,7 +319,11 @@ TEST_F(SmsFolderViewTest, PasteFilesTheTransferFileIntoThePageShowing) {
     int32_t used = 0, total = 0;
     ASSERT_EQ(SmsSelectSimStorage(link_, &used, &total), 1);
     EXPECT_EQ(used, 5);
-    Snap("sms-outbox");
+    for (int page : {kPageOutbox, kPageSent, kPageDraft, kPagePda}) {
+        folder_->SelectPage(page);
+        Select(page, 0);
+        Snap(("sms-page-" + std::to_string(page)).c_str());
+    }
 
     // A full SIM refuses an Outbox paste.
     ASSERT_EQ(sim_->Control("capacity 5"), "OK");
