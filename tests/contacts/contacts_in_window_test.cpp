@@ -1,0 +1,119 @@
+// Contacts inside the dialer's own window with every view the program has, sharing one set of
+// caches as the program does: Manage Contacts lists the demo SIM, a contact made with New goes to
+// the card, and a call from its number rings on the DialPad with the new name.
+#include <gtest/gtest.h>
+
+#include <QApplication>
+#include <QLabel>
+#include <QLineEdit>
+#include <QTreeWidget>
+#include <chrono>
+#include <functional>
+#include <memory>
+#include <thread>
+
+#include "calls/call_log.h"
+#include "calls/dial_pad.h"
+#include "cardsim/card_sim.h"
+#include "contacts/manage_contacts_view.h"
+#include "link/link.h"
+#include "shell/card_watch.h"
+#include "shell/dialogs.h"
+#include "shell/main_window.h"
+#include "shell/messages.h"
+#include "shell/view_factories.h"
+#include "support/settings_store.h"
+#include "support/text.h"
+#include "tests/common/temp_folder.h"
+
+namespace vqm {
+namespace {
+
+// The card manager's side: the link opens on the simulated card's device.
+class SimHost : public CardHost {
+  public:
+    explicit SimHost(Link& link) : link_(link) {}
+    bool CompanionExists() override { return false; }
+    std::optional<long> SendCompanion(unsigned) override { return std::nullopt; }
+    int OpenLink() override { return PortOpenDevice(link_, device.c_str()); }
+    void CloseLink() override { PortClose(link_); }
+    int CardPresent() override { return 1; }
+    void Sleep(int) override {}
+    std::string device;
+
+  private:
+    Link& link_;
+};
+
+bool WaitFor(const std::function<bool()>& done) {
+    const auto until = std::chrono::steady_clock::now() + std::chrono::seconds(30);
+    while (!done()) {
+        if (std::chrono::steady_clock::now() > until) return false;
+        QApplication::processEvents(QEventLoop::AllEvents, 20);
+        std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    }
+    return true;
+}
+
+TEST(ContactsInWindowTest, ANewContactsCallRingsWithItsName) {
+    const testing::TempFolder temp;
+    SettingsStore settings(temp / "settings.db");
+    SetSettingString(settings, u"InstallPath", Utf8ToUtf16(temp / "").c_str());
+    SetSettingString(settings, kContactsFolderSetting, Utf8ToUtf16(temp / "cards").c_str());
+    cardsim::SimConfig config;
+    config.baud = 0;
+    config.stateFile = temp / "card.state";
+    config.engine.ringTimeoutMs = 600000;
+    cardsim::CardSim sim(config);
+    ASSERT_TRUE(sim.PowerUp());
+
+    Link link(settings, DriverRoots{temp / "run", temp / "tty"});
+    Dialogs dialogs;
+    dialogs.SetResponder([](const DialogRequest& request) {
+        if (!request.isDialog || request.title != u"New Contacts") return kIdOk;
+        auto* dialog = static_cast<ContactDialog*>(request.dialog);
+        dialog->Name()->setText("Nina New");
+        dialog->Number()->setText("+4930555777");
+        return kIdOk;
+    });
+    CallLog callLog(settings);
+    PhonebookCaches caches(settings);
+    caches.pause = [](int) {};
+    ShellContext context{settings, link, dialogs, temp / "run"};
+    context.callLog = &callLog;
+    context.caches = &caches;
+    SimHost host(link);
+    host.device = sim.DevicePath();
+    {
+        MainWindow window(context, DefaultViewFactories(), &host);
+        window.StopWatchTimer();
+        ASSERT_EQ(host.OpenLink(), 1);
+        window.Watch().SetCardState(2);
+        auto* contacts = dynamic_cast<ManageContactsView*>(window.ViewAt(kViewManageContacts));
+        ASSERT_NE(contacts, nullptr);
+
+        window.Command(kCmdViewFirst + kViewManageContacts);
+        ASSERT_TRUE(WaitFor([&] { return contacts->LoadState().sim == 2; }));
+        EXPECT_EQ(contacts->List(kContactsSimPage)->topLevelItemCount(), 8);
+
+        contacts->ShowPage(kContactsSimPage);
+        contacts->Command(kCmdContactNew);
+        EXPECT_EQ(contacts->List(kContactsSimPage)->topLevelItemCount(), 9);
+
+        ASSERT_EQ(sim.Control("ring +4930555777"), "OK");
+        View* pad = window.ViewAt(kViewDialPad);
+        auto text = [pad](int id) {
+            auto* label = qobject_cast<QLabel*>(FindControl(pad, id));
+            return label ? label->text().toStdString() : std::string();
+        };
+        ASSERT_TRUE(WaitFor([&] { return text(kStatusLine1Id) == "Incoming call"; }));
+        EXPECT_TRUE(WaitFor([&] { return text(kStatusLine2Id) == "Nina New"; }))
+            << text(kStatusLine2Id);
+        EXPECT_EQ(window.Views().current, kViewDialPad);
+        sim.Control("caller-hangup");
+        PortClose(link);
+    }
+}
+
+}  // namespace
+}  // namespace vqm
