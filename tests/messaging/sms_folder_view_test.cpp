@@ -278,6 +278,39 @@ TEST_F(SmsFolderViewTest, ANewMessageIsAnnouncedOnTheDialPadAndTakenIntoTheInbox
     EXPECT_EQ(copies, 1);
 }
 
+TEST_F(SmsFolderViewTest, AMessageThatFillsTheSimIsAnnouncedBesideSimFull) {
+    Start();
+    ASSERT_EQ(sim_->Control("capacity 5"), "OK");
+    ASSERT_EQ(sim_->Control("deliver +4412 The last place"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return Notice().find(u"new SMS") != std::u16string::npos; }))
+        << Utf16ToUtf8(Notice());
+    const std::u16string notice = Notice();
+    EXPECT_EQ(notice.substr(notice.size() - 9), u"/SIM Full") << Utf16ToUtf8(notice);
+    // The card refuses what does not fit: no "+CMTI:", nothing more noted.
+    EXPECT_NE(sim_->Control("deliver +4412 No room"), "OK");
+    EXPECT_EQ(IndexListCount(settings_, kNewIdx), 1);
+}
+
+TEST_F(SmsFolderViewTest, LosingTheCardEmptiesTheSimPagesAndTheNextShowRefreshesAgain) {
+    Start();
+    OpenFolder();
+    ASSERT_EQ(List(kPageInbox)->topLevelItemCount(), 3);
+    window_->Watch().SetCardState(1);
+    EXPECT_EQ(folder_->RefreshState(), kFolderNotRefreshed);
+    EXPECT_EQ(List(kPageInbox)->topLevelItemCount(), 0);
+    EXPECT_FALSE(std::filesystem::exists(install_ + "smsmsg1.db"));
+    auto* reply = qobject_cast<QAbstractButton*>(FindControl(folder_, kFolderReplyFirstId));
+    ASSERT_NE(reply, nullptr);
+    EXPECT_FALSE(reply->isEnabled());
+
+    ASSERT_EQ(host_.OpenLink(), 1);
+    window_->Watch().SetCardState(2);
+    EXPECT_TRUE(reply->isEnabled());
+    window_->ShowDialPad();
+    OpenFolder();
+    EXPECT_EQ(List(kPageInbox)->topLevelItemCount(), 3);
+}
+
 TEST_F(SmsFolderViewTest, PasteFilesTheTransferFileIntoThePageShowing) {
     Start();
     OpenFolder();
