@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "messaging/sms_at.h"
+#include "messaging/sms_folder.h"
 
 namespace {
 
@@ -25,6 +26,10 @@ void Parse(const std::vector<char>& reply) {
     vqm::SmsRecord pdu{};
     vqm::SmsParsePduReply(reply.data(), length, &pdu);
     Check(pdu);
+    // What the folder makes of the record: its part mark and the text it shows.
+    vqm::SmsPartInfo part{};
+    vqm::SmsPartOf(pdu, &part);
+    if (vqm::MessageBodyText(pdu).size() > sizeof pdu.text) __builtin_trap();
     vqm::SmsRecord text{};
     vqm::SmsParseTextReply(reply.data(), length, &text);
     Check(text);
