@@ -1,17 +1,13 @@
 #include "calls/dial_pad.h"
 
-#include <poll.h>
-#include <unistd.h>
-
-#include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <mutex>
-#include <shared_mutex>
 
 #include "calls/call_log.h"
 #include "contacts/phonebook_cache.h"
 #include "link/link.h"
+#include "link/voice_at.h"
 #include "shell/messages.h"
 #include "support/local_socket.h"
 #include "support/numbers.h"
@@ -22,49 +18,7 @@ namespace vqm {
 
 namespace {
 
-constexpr int kByteWaitMs = 200;    // a one-byte read waits at most this long
-constexpr int kAnswerPollMs = 100;  // the pause between looks for the first reply byte
-constexpr float kLastUncancellableFirmware = 3.81f;
 constexpr size_t kDialNumberBytes = 32;
-
-void Pause(Link& link, int ms) {
-    if (link.sleepMs)
-        link.sleepMs(ms);
-    else
-        std::this_thread::sleep_for(std::chrono::milliseconds(ms));
-}
-
-enum class ByteRead { Byte, Silent, Failed };
-
-// The dial thread owns the port for the whole exchange and talks to the descriptor itself, a
-// byte at a time, as the link's transaction does; a hang-up or I/O error is a failed read.
-ByteRead ReadOne(int fd, char* out, int timeoutMs) {
-    pollfd p{fd, POLLIN, 0};
-    for (;;) {
-        const int ready = poll(&p, 1, timeoutMs);
-        if (ready < 0 && errno == EINTR) continue;
-        if (ready < 0) return ByteRead::Failed;
-        if (ready == 0) return ByteRead::Silent;
-        if (!(p.revents & POLLIN)) return ByteRead::Failed;
-        const ssize_t n = read(fd, out, 1);
-        if (n == 1) return ByteRead::Byte;
-        if (n < 0 && (errno == EINTR || errno == EAGAIN)) return ByteRead::Silent;
-        return ByteRead::Failed;
-    }
-}
-
-bool WriteOne(int fd, char byte) {
-    for (;;) {
-        const ssize_t n = write(fd, &byte, 1);
-        if (n == 1) return true;
-        if (n < 0 && errno == EINTR) continue;
-        if (n < 0 && errno == EAGAIN) {
-            pollfd p{fd, POLLOUT, 0};
-            if (poll(&p, 1, kByteWaitMs) > 0) continue;
-        }
-        return false;
-    }
-}
 
 std::u16string Wide(const char* narrow) {
     char16_t wide[64];
@@ -125,94 +79,6 @@ void DialPadEmpty(DialNumber& number) {
     number.count = 1;
 }
 
-// AT operations
-
-int AnswerCall(Link& link) {
-    char reply[256];
-    const int length = static_cast<int>(AtCommand(link, "ATA\r", reply, sizeof reply));
-    return length == 0 ? -1 : AtFinalResult(reply, length);
-}
-
-int HangUp(Link& link) {
-    char reply[256];
-    return AtCommand(link, "ATH\r", reply, sizeof reply) > 0 ? 1 : 0;
-}
-
-int SendDtmf(Link& link, char c) {
-    int state = -1, mode = -1;
-    if (!QueryCallState(link, &state, &mode) || state != 0 || mode != 0) return 0;
-    char command[16], reply[256];
-    std::snprintf(command, sizeof command, "AT+VTS=%c\r", c);
-    return AtCommand(link, command, reply, sizeof reply) > 0 ? 1 : 0;
-}
-
-int DialExchange(Link& link, const char* number, std::atomic<int>& cancel) {
-    // The flag is read and cleared in one step, so a cancel is never taken twice.
-    auto takeCancel = [&cancel] { return cancel.exchange(0) == 1; };
-    if (link.portState.load() == 0 || takeCancel()) return -1;
-    char pending[257];
-    AtReadPending(link, pending, 256);
-    if (takeCancel()) return -1;
-    if (!PortLock(link)) return -1;
-    if (takeCancel()) {
-        PortUnlock(link);
-        return -1;
-    }
-
-    char command[48];
-    int commandLength = std::snprintf(command, sizeof command, "ATD%s;\r", number ? number : "");
-    if (commandLength < 0) commandLength = 0;
-    if (commandLength >= static_cast<int>(sizeof command))
-        commandLength = static_cast<int>(sizeof command) - 1;
-
-    char reply[256] = {};
-    int length = 0;
-    bool failed = false, cancelled = false;
-    {
-        std::shared_lock<std::shared_mutex> io(link.ioGuard);
-        const int fd = link.fd;
-        if (fd < 0 || link.portState.load() == 0) failed = true;
-        for (int i = 0; !failed && i < commandLength; ++i) {
-            char echo;
-            if (!WriteOne(fd, command[i]) || ReadOne(fd, &echo, kByteWaitMs) == ByteRead::Failed)
-                break;
-        }
-        if (!failed && takeCancel()) cancelled = true;
-        // Older firmware cannot take the dial back once sent: the wait runs to the card's
-        // answer (or until the port closes).
-        const bool cancellable = link.firmwareVersion > kLastUncancellableFirmware;
-        while (!failed && !cancelled) {
-            Pause(link, kAnswerPollMs);
-            if (cancellable && takeCancel()) {
-                cancelled = true;
-                break;
-            }
-            if (link.portState.load() == 0) {
-                failed = true;
-                break;
-            }
-            const ByteRead r = ReadOne(fd, &reply[0], kByteWaitMs);
-            if (r == ByteRead::Byte) {
-                length = 1;
-                break;
-            }
-            if (r == ByteRead::Failed) failed = true;
-        }
-        if (!failed && !cancelled) {
-            char byte;
-            while (ReadOne(fd, &byte, kByteWaitMs) == ByteRead::Byte)
-                if (length + 1 < static_cast<int>(sizeof reply)) reply[length++] = byte;
-            reply[length] = '\0';
-        }
-    }
-    PortUnlock(link);
-    if (failed || cancelled || takeCancel()) return -1;
-    // Codes that came with the answer wait in the queue for the listener's next pass.
-    if (link.events) link.events->UnsolicitedScan(reply, length);
-    // Only as many reply bytes as the command had are searched for the result.
-    return AtFinalResult(reply, commandLength);
-}
-
 // The DialPad
 
 DialPad::DialPad(Link& link, SettingsStore& settings, CallLog& callLog, PhonebookCaches& caches,
@@ -253,6 +119,15 @@ long DialPad::OnMessage(unsigned msg, long wParam, long lParam) {
         case kMsgCallListEmpty:
             OnCallListEmpty();
             return 0;
+        case kMsgPollRead:
+            OnPollRead(static_cast<int>(wParam), lParam != 0);
+            return 0;
+        case kMsgVolumeSet:
+            OnVolumeSet(static_cast<int>(wParam), static_cast<int>(lParam));
+            return 0;
+        case kMsgAnswerResult:
+            OnAnswerResult(static_cast<int>(wParam));
+            return 0;
         case kWmLButtonDown:
         case kWmLButtonUp:
             if (wParam == kPowerKeyId) OnPowerKey(msg == kWmLButtonDown);
@@ -275,6 +150,11 @@ void DialPad::Destroy() {
         DialCancel();
         ui_.WaitWhileDelivering([this] { return dialThreadDone_.load(); });
     }
+    // The hang-up queued above still goes out; the port is closed by now at shutdown, so
+    // what is left ends at once.
+    worker_.Stop();
+    ui_.WaitWhileDelivering([this] { return worker_.Idle(); });
+    worker_.Join();
     destroyed_ = true;
     JoinDialThread();
 }
@@ -399,7 +279,7 @@ void DialPad::OnKey(char16_t c) {
         DialPadAppend(number_, c, now_());
         RefreshNumberDisplay();
     } else if (callState_ == kCallVoice) {
-        SendDtmf(link_, static_cast<char>(c));
+        worker_.Post([this, c] { SendDtmf(link_, static_cast<char>(c)); });
     }
 }
 
@@ -412,15 +292,26 @@ void DialPad::OnCallKey() {
         } else {
             Dial(DialPadText(number_));
         }
-    } else if (callState_ == kCallRinging) {
-        if (AnswerCall(link_) == 0) {
-            CallAnswered();
-        } else {
-            // The ring stops with the failed answer: a tone under "Call ended" would mislead.
-            ui_.StopRingTone();
-            EndWith(u"Call ended");
-        }
+    } else if (callState_ == kCallRinging && !answering_) {
+        answering_ = true;
+        worker_.Post([this] { ui_.PostToDialPad(kMsgAnswerResult, AnswerCall(link_), 0); });
     }
+}
+
+void DialPad::OnAnswerResult(int result) {
+    answering_ = false;
+    if (callState_ != kCallRinging) return;  // ended meanwhile
+    if (result == 0) {
+        CallAnswered();
+    } else {
+        // The ring stops with the failed answer: a tone under "Call ended" would mislead.
+        ui_.StopRingTone();
+        EndWith(u"Call ended");
+    }
+}
+
+void DialPad::HangUpLater() {
+    worker_.Post([this] { HangUp(link_); });
 }
 
 void DialPad::OnEndKey() {
@@ -430,11 +321,11 @@ void DialPad::OnEndKey() {
             DialCancel();
             break;
         case kCallVoice:
-            HangUp(link_);
+            HangUpLater();
             EndWith(u"Call ended");
             break;
         case kCallRinging: {
-            HangUp(link_);
+            HangUpLater();
             EndWith(u"Unanswered");
             ui_.StopRingTone();
             char narrow[kCallLogNumberSize];
@@ -465,15 +356,21 @@ void DialPad::OnDialResult(int result) {
             break;
         default:
             EndWith(u"Call could not be established");
-            HangUp(link_);
+            HangUpLater();
             break;
     }
     ui_.EnableControl(kKeyCallId, true);
 }
 
 void DialPad::OnCallActive() {
-    if (callState_ != kCallRinging) return;
-    CallAnswered();  // on the card's own controls
+    if (callState_ == kCallRinging) return CallAnswered();  // on the card's own controls
+    if (callState_ == kCallIdle && connected_) {
+        // A call the card already had (a restarted dialer, a card put back): shown, so that
+        // End can end it.
+        LeaveIdle();
+        SetStatusLine(1, u"Voice call");
+        callState_ = kCallVoice;
+    }
 }
 
 // A ringing call answered, by the Call key or on the card: logged, the ring stops, talk starts.
@@ -499,26 +396,21 @@ void DialPad::OnCallListEmpty() {
 void DialPad::OnTimer(int id) {
     if (id == kTimerPowerKey) return PowerKeyHeld();
     if (id != kTimerDialPad) return;
-    auto refreshGauge = [this] {
-        const int bars = GetSignalBars(link_);
-        if (bars >= 0) {
-            signalBars_ = bars;
-            ui_.SetSignalBars(bars);
-        }
-    };
-    if (++ticks_ % kSignalRefreshTicks == 0) refreshGauge();
-    // The dial thread holds the port for the whole dial: a read now would only stall the pad.
-    if (operatorName_.empty() && callState_ != kCallDialing) {
-        char16_t name[33] = {};
-        if (GetOperatorName(link_, name, 33) && name[0]) {
-            operatorName_ = name;
-            // Away from idle the name waits among the idle lines for the pad's return.
-            if (callState_ == kCallIdle)
-                SetStatusLine(1, operatorName_);
-            else
-                idleLines_[0] = operatorName_;
-        }
-        refreshGauge();
+    const bool gauge = ++ticks_ % kSignalRefreshTicks == 0;
+    // The dial thread holds the port for the whole dial: a read now would only queue.
+    const bool needOperator = operatorName_.empty() && callState_ != kCallDialing;
+    if ((gauge || needOperator) && !polling_) {
+        polling_ = true;
+        worker_.Post([this, needOperator] {
+            char16_t name[33] = {};
+            const bool named = needOperator && GetOperatorName(link_, name, 33) && name[0];
+            const int bars = GetSignalBars(link_);
+            if (named) {
+                std::lock_guard<std::mutex> lock(polledMutex_);
+                polledOperator_ = name;
+            }
+            ui_.PostToDialPad(kMsgPollRead, bars, named ? 1 : 0);
+        });
     }
     if (callState_ == kCallEnded && now_() - endedAt_ >= std::chrono::milliseconds(kResultShowMs)) {
         SetStatusLine(1, idleLines_[0]);
@@ -528,6 +420,37 @@ void DialPad::OnTimer(int id) {
     }
 }
 
+void DialPad::OnPollRead(int bars, bool named) {
+    polling_ = false;
+    if (!connected_) return;  // the card went while the poll ran
+    if (bars >= 0) {
+        signalBars_ = bars;
+        ui_.SetSignalBars(bars);
+    }
+    if (!named || !operatorName_.empty()) return;
+    {
+        std::lock_guard<std::mutex> lock(polledMutex_);
+        operatorName_ = polledOperator_;
+    }
+    // Away from idle the name waits among the idle lines for the pad's return.
+    if (callState_ == kCallIdle)
+        SetStatusLine(1, operatorName_);
+    else
+        idleLines_[0] = operatorName_;
+}
+
+void DialPad::OnVolumeSet(int result, int level) {
+    if (!connected_) return;
+    if (result == 0) {
+        volumeLevel_ = level;
+    } else if (initialVolume_) {
+        ui_.EnableControl(kVolumeSliderId, false);
+    }
+    initialVolume_ = false;
+    // The card kept its level when it refused; so does the slider.
+    ui_.SetSliderPosition(volumeLevel_);
+}
+
 void DialPad::SetAllKeys(bool enable) {
     for (int id = kKeyZeroId; id <= kKeyContactsId; ++id)
         ui_.EnableControl(id, enable);
@@ -535,6 +458,7 @@ void DialPad::SetAllKeys(bool enable) {
 
 void DialPad::OnCardState(int state) {
     if (state == 1) {
+        connected_ = false;
         ui_.StopTimer(kTimerDialPad);
         SetAllKeys(false);
         ui_.EnableControl(kVolumeSliderId, false);
@@ -552,6 +476,7 @@ void DialPad::OnCardState(int state) {
         return;
     }
     if (state != 2) return;
+    connected_ = true;
     SetAllKeys(true);
     ui_.EnableControl(kVolumeSliderId, true);
     SetStatusLine(1, u"Searching network...");
@@ -567,11 +492,10 @@ void DialPad::OnCardState(int state) {
     }
     if (level < 0) level = 0;
     if (level > kMaxVolumeLevel) level = kMaxVolumeLevel;
-    if (SetSpeakerVolume(link_, level) != 0)
-        ui_.EnableControl(kVolumeSliderId, false);
-    else
-        volumeLevel_ = level;
-    ui_.SetSliderPosition(volumeLevel_);
+    initialVolume_ = true;
+    ui_.SetSliderPosition(level);
+    worker_.Post(
+        [this, level] { ui_.PostToDialPad(kMsgVolumeSet, SetSpeakerVolume(link_, level), level); });
     const int32_t poweredUp = 0;
     SetSettingInt(settings_, u"DialPadPowerDown", &poweredUp);
     ticks_ = 0;
@@ -581,10 +505,9 @@ void DialPad::OnCardState(int state) {
 void DialPad::OnSlider(int code) {
     if (!(code < 4 || code == kTbEndTrack)) return;
     const int position = ui_.SliderPosition();
-    if (SetSpeakerVolume(link_, position) == 0)
-        volumeLevel_ = position;
-    else
-        ui_.SetSliderPosition(volumeLevel_);  // the card kept its level; so does the slider
+    worker_.Post([this, position] {
+        ui_.PostToDialPad(kMsgVolumeSet, SetSpeakerVolume(link_, position), position);
+    });
 }
 
 void DialPad::OnPowerKey(bool down) {

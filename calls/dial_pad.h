@@ -7,11 +7,14 @@
 #include <chrono>
 #include <cstddef>
 #include <functional>
+#include <mutex>
 #include <optional>
 #include <string>
 #include <thread>
 
 #include "calls/alerts.h"
+#include "calls/card_worker.h"
+#include "link/voice_at.h"
 
 namespace vqm {
 
@@ -35,6 +38,10 @@ inline constexpr int kStatusLine1Id = 1144, kStatusLine2Id = 1145, kStatusLine3I
 inline constexpr int kNotificationLineId = 1147, kNumberDisplayId = 1148;
 
 inline constexpr int kTimerDialPad = 1001, kTimerPowerKey = 1002;
+// What the DialPad's card worker reports back: the timed poll (wParam the signal bars or -1,
+// lParam 1 when an operator name was read), a volume change (wParam the card's result, lParam
+// the level), the answer to a ring (wParam the final result).
+inline constexpr unsigned kMsgPollRead = 2141, kMsgVolumeSet = 2142, kMsgAnswerResult = 2143;
 inline constexpr unsigned kWmHScroll = 276;
 // Track-bar notification codes the slider acts on: below 4 (line and page steps) or 8.
 inline constexpr int kTbEndTrack = 8;
@@ -63,19 +70,6 @@ int DialPadAppend(DialNumber& number, char16_t c, std::chrono::steady_clock::tim
 int DialPadBackspace(DialNumber& number);
 std::u16string DialPadText(const DialNumber& number);
 void DialPadEmpty(DialNumber& number);
-
-// AT operations of a voice call.
-// "ATA": the final result of the reply, -1 when none came.
-int AnswerCall(Link& link);
-// "ATH": 1 when the card answered at all.
-int HangUp(Link& link);
-// "AT+VTS=c", only while the call list shows an active voice call: 1 on a reply.
-int SendDtmf(Link& link, char c);
-
-// The dial exchange of the dial thread: "ATD<number>;" written with the port held throughout,
-// the reply waited for (cancellable through cancel only for firmware above 3.81), the port
-// released. Returns the final result found within the command's length, or -1.
-int DialExchange(Link& link, const char* number, std::atomic<int>& cancel);
 
 // What the logic needs from the view and the main window.
 class DialPadUi {
@@ -115,6 +109,8 @@ class DialPadUi {
     // Any thread: delivers the message to the DialPad on its own thread and waits, as
     // SendMessage did (the dial thread's 2125).
     virtual long SendToDialPad(unsigned msg, long wParam, long lParam) = 0;
+    // Any thread: queues the message for the DialPad's thread without waiting.
+    virtual void PostToDialPad(unsigned msg, long wParam, long lParam) = 0;
     // The DialPad's thread: waits until done() holds, delivering other threads' sends meanwhile.
     virtual void WaitWhileDelivering(const std::function<bool()>& done) = 0;
 };
@@ -170,6 +166,10 @@ class DialPad {
     void CallAnswered();
     void OnCallListEmpty();
     void OnTimer(int id);
+    void OnPollRead(int bars, bool named);
+    void OnVolumeSet(int result, int level);
+    void OnAnswerResult(int result);
+    void HangUpLater();
     void OnCardState(int state);
     void OnSlider(int code);
     void OnPowerKey(bool down);
@@ -205,6 +205,15 @@ class DialPad {
     std::atomic<bool> dialThreadDone_{true};
 
     Notices notices_;
+
+    // Every exchange the pad starts runs here, never on the window's thread.
+    CardWorker worker_;
+    bool connected_ = false;
+    bool polling_ = false;        // a timed poll is under way
+    bool answering_ = false;      // an ATA is under way
+    bool initialVolume_ = false;  // the volume set at connection, whose refusal greys the slider
+    std::mutex polledMutex_;
+    std::u16string polledOperator_;
 };
 
 }  // namespace vqm

@@ -536,6 +536,10 @@ long DialPadView::SendToDialPad(unsigned msg, long wParam, long lParam) {
     return Messages().Send(this, msg, wParam, lParam);
 }
 
+void DialPadView::PostToDialPad(unsigned msg, long wParam, long lParam) {
+    Messages().Post(this, msg, wParam, lParam);
+}
+
 void DialPadView::WaitWhileDelivering(const std::function<bool()>& done) {
     Messages().WaitWhileDelivering(done);
 }

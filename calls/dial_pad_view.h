@@ -63,6 +63,7 @@ class DialPadView : public View, public DialPadUi {
     bool CompanionExists() override;
     std::optional<long> SendCompanion(unsigned msg) override;
     long SendToDialPad(unsigned msg, long wParam, long lParam) override;
+    void PostToDialPad(unsigned msg, long wParam, long lParam) override;
     void WaitWhileDelivering(const std::function<bool()>& done) override;
 
   protected:

@@ -107,6 +107,18 @@ int EventLog::EventLogCount() {
     return size > 0 ? static_cast<int>(size / static_cast<long>(kEventRecordSize)) : 0;
 }
 
+int EventLog::EventLogPeek(EventRecord* recordOut) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    FILE* log = std::fopen(path_.c_str(), "rb");
+    if (!log) return 0;
+    unsigned char bytes[kEventRecordSize];
+    const bool whole = std::fread(bytes, 1, sizeof bytes, log) == sizeof bytes;
+    std::fclose(log);
+    if (!whole) return 0;
+    if (recordOut) DecodeEventRecord(bytes, recordOut);
+    return 1;
+}
+
 int EventLog::EventLogPop(EventRecord* recordOut) {
     std::lock_guard<std::mutex> lock(mutex_);
     const std::string tmpPath = path_ + ".tmp";

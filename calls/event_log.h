@@ -59,6 +59,8 @@ class EventLog {
     // Takes the oldest record off the queue: 1, or 0 when the log or the temporary file
     // cannot be opened. The last record's pop removes the file.
     int EventLogPop(EventRecord* recordOut);
+    // Reads the oldest record without taking it off: 1, or 0 when the queue is empty.
+    int EventLogPeek(EventRecord* recordOut);
 
   private:
     std::string path_;

@@ -1,5 +1,7 @@
 #include "calls/unsolicited.h"
 
+#include <cstring>
+
 #include "support/text.h"
 
 namespace vqm {
@@ -24,23 +26,43 @@ int UnsolicitedEvents::UnsolicitedScan(const char* reply, int length) {
     return result;
 }
 
+int UnsolicitedEvents::QueueLine(const char* line, int length) {
+    if (!line || length <= 0) return 0;
+    for (size_t row = 0; row < kUnsolicitedCodes.size(); ++row) {
+        const UnsolicitedCode& code = kUnsolicitedCodes[row];
+        if (length >= code.tagLength && std::memcmp(line, code.tag, code.tagLength) == 0)
+            return log_.EventLogAppend(
+                MakeEventRecord(static_cast<uint8_t>(row), line, line + length, now_()));
+    }
+    return 0;
+}
+
 int UnsolicitedEvents::DispatchEvent(const EventRecord& record) {
     if (record.type >= handlers_.size() || !handlers_[record.type]) return 0;
     return handlers_[record.type](record);
 }
 
 int UnsolicitedEvents::DispatchOldest() {
+    std::lock_guard<std::mutex> lock(dispatchMutex_);
     EventRecord record{};
-    if (log_.EventLogCount() == 0 || !log_.EventLogPop(&record)) return 0;
+    if (!log_.EventLogPeek(&record)) return 0;
     DispatchEvent(record);
+    log_.EventLogPop(nullptr);
     return 1;
 }
 
-int UnsolicitedEvents::DispatchQueued() {
+int UnsolicitedEvents::DispatchAll(int* rings) {
     const int count = log_.EventLogCount();
     int dispatched = 0;
-    for (int i = 0; i < count; ++i)
-        dispatched += DispatchOldest();
+    for (int i = 0; i < count; ++i) {
+        std::lock_guard<std::mutex> lock(dispatchMutex_);
+        EventRecord record{};
+        if (!log_.EventLogPeek(&record)) break;
+        DispatchEvent(record);
+        log_.EventLogPop(nullptr);
+        if (rings && record.type == kEventRing) ++*rings;
+        ++dispatched;
+    }
     return dispatched;
 }
 

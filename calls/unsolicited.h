@@ -6,6 +6,7 @@
 #include <array>
 #include <chrono>
 #include <functional>
+#include <mutex>
 
 #include "calls/event_log.h"
 #include "link/event_sink.h"
@@ -41,15 +42,20 @@ class UnsolicitedEvents : public EventSink {
     // last append (1 when something was queued), else 0.
     int UnsolicitedScan(const char* reply, int length) override;
 
+    // Queues the line when it opens with one of the codes.
+    int QueueLine(const char* line, int length) override;
+
     // Calls the handler of the record's row; 0 when the row has none or the type is unknown.
     int DispatchEvent(const EventRecord& record);
 
-    // Takes the oldest record off the queue and dispatches it; 0 when the queue was empty.
-    int DispatchOldest() override;
+    // Dispatches the oldest record and then takes it off the queue, so a record is never
+    // lost between the two; 0 when the queue was empty.
+    int DispatchOldest();
 
     // Dispatches as many records as the queue held when called: records queued meanwhile
     // wait for the next pass. Returns how many were dispatched.
-    int DispatchQueued() override;
+    int DispatchQueued() { return DispatchAll(nullptr); }
+    int DispatchAll(int* rings) override;
 
     EventLog& Log() { return log_; }
 
@@ -57,6 +63,8 @@ class UnsolicitedEvents : public EventSink {
     EventLog& log_;
     Clock now_;
     std::array<EventHandler, kUnsolicitedCodes.size()> handlers_;
+    // One dispatcher at a time, so records are handled in the order they were queued.
+    std::mutex dispatchMutex_;
 };
 
 }  // namespace vqm

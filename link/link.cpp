@@ -12,8 +12,13 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <string>
+#include <vector>
+
+#include <sys/eventfd.h>
 
 #include "link/operators.h"
+#include "link/reply_framer.h"
 #include "support/lock_within.h"
 #include "support/text.h"
 
@@ -24,7 +29,8 @@ namespace {
 constexpr int kMutexWaitMs = 5000;
 constexpr int kReadTimeoutMs = 200;  // a one-byte read waits at most this long
 constexpr int kAnswerPollMs = 100;   // the wait between looks for the first reply byte
-constexpr int kLockRetryMs = 200;
+constexpr int kInitAnswerLimitMs = 1000;
+constexpr int kInterByteMs = 20;  // the bytes of one line follow each other closer
 
 const char kInitCommands[7][32] = {
     "AT&F\r",
@@ -85,71 +91,177 @@ bool WriteByte(int fd, char byte) {
     }
 }
 
-// After the port is free: queue what the text holds and hand the oldest record to its
-// handler on this thread; later records wait for the listener.
-void HandleUnsolicited(Link& link, const char* text, unsigned length) {
-    if (link.events && length > 0 && link.events->UnsolicitedScan(text, static_cast<int>(length)))
-        link.events->DispatchOldest();
+// Hands each unsolicited line to the event sink and wakes the listener, which dispatches the
+// queued records in order; the transaction itself dispatches nothing.
+void QueueUnsolicited(Link& link, const std::vector<std::string>& lines) {
+    bool queued = false;
+    for (const std::string& line : lines)
+        if (link.events && link.events->QueueLine(line.data(), static_cast<int>(line.size())))
+            queued = true;
+    if (queued) WakeListener(link);
 }
 
-using LockFunction = int (*)(Link&);
+// Reads what is waiting on the port into a framer, each byte with at most waitMs of silence.
+// Returns false when the device failed.
+bool ReadInto(int fd, ReplyFramer& framer, int waitMs, size_t limit, unsigned* count) {
+    char byte;
+    for (size_t n = 0; n < limit; ++n) {
+        ReadResult r = ReadByte(fd, &byte, waitMs);
+        if (r == ReadResult::Failed) return false;
+        if (r == ReadResult::Silent) return true;
+        framer.Feed(byte);
+        if (count) ++*count;
+    }
+    return true;
+}
 
-unsigned Transact(Link& link, LockFunction lock, const char* command, char* reply,
-                  size_t replySize) {
+bool WriteAll(int fd, const char* bytes, size_t count) {
+    for (size_t i = 0; i < count; ++i)
+        if (!WriteByte(fd, bytes[i])) return false;
+    return true;
+}
+
+bool TakeCancel(const ExchangeOptions& options) {
+    return options.cancel && options.cancel->exchange(0) == 1;
+}
+
+// Silence before the final result only means a slow modem; this long of it, once the reply
+// has begun, means the final result is not coming.
+constexpr int kMissingResultMs = 2000;
+// How long a taken-back dial's result is waited for.
+constexpr int kAbortResultMs = 1000;
+
+}  // namespace
+
+void WakeListener(Link& link) {
+    if (link.wakeFd < 0) return;
+    const uint64_t one = 1;
+    (void)!write(link.wakeFd, &one, sizeof one);
+}
+
+unsigned AtExchange(Link& link, const char* command, char* reply, size_t replySize,
+                    const ExchangeOptions& options) {
     if (!reply || replySize == 0) return 0;
     reply[0] = '\0';
     if (link.portState.load() == 0 || !command) return 0;
-    char pending[256];
-    AtReadPending(link, pending, sizeof pending - 1);
-    reply[0] = '\0';
-    if (!lock(link)) return 0;
+    if (!options.lockHeld && !(options.tryLock ? PortTryLock(link) : PortLock(link))) return 0;
 
-    unsigned length = 0;
+    ReplyFramer framer(command, reply, replySize);
     bool failed = false;
     {
         std::shared_lock<std::shared_mutex> io(link.ioGuard);
         const int fd = link.fd;
-        if (fd < 0 || link.portState.load() == 0) {
-            failed = true;
+        if (fd < 0 || link.portState.load() == 0) failed = true;
+        if (!failed) {
+            // Stray bytes first: a line begun before this command is finished, not taken
+            // for the reply.
+            ReplyFramer stray(nullptr, nullptr, 0);
+            stray.ResumeLine(link.partialLine);
+            link.partialLine.clear();
+            if (!ReadInto(fd, stray, 0, 4096, nullptr)) failed = true;
+            QueueUnsolicited(link, stray.TakeUnsolicited());
+            framer.ResumeLine(stray.PartialLine());
+        }
+        const size_t commandLength = failed ? 0 : std::strlen(command);
+        if (!failed && link.echo.load() == EchoMode::Silent) {
+            failed = !WriteAll(fd, command, commandLength);
         } else {
-            for (const char* p = command; *p; ++p) {
-                char echo;
-                if (!WriteByte(fd, *p) || ReadByte(fd, &echo, kReadTimeoutMs) == ReadResult::Failed)
-                    break;
-            }
-            // No overall limit: a network operation may take many seconds. Closing the port
-            // is what ends a wait for a card that never answers.
-            for (;;) {
-                Sleep(link, kAnswerPollMs);
-                if (link.portState.load() == 0) {
-                    failed = true;
-                    break;
-                }
-                ReadResult r = ReadByte(fd, &reply[0], kReadTimeoutMs);
-                if (r == ReadResult::Byte) break;
-                if (r == ReadResult::Failed) {
-                    failed = true;
-                    break;
-                }
-            }
-            if (!failed) {
-                length = replySize > 1 ? 1 : 0;
+            // The card echoes each byte as it takes it: write one, read one. A modem that
+            // stays silent after the first byte does not echo, and is not waited for again.
+            for (size_t i = 0; !failed && i < commandLength; ++i) {
+                if (!WriteByte(fd, command[i])) break;
+                if (link.echo.load() == EchoMode::Silent || !framer.EchoPending()) continue;
                 char byte;
-                while (ReadByte(fd, &byte, kReadTimeoutMs) == ReadResult::Byte) {
-                    if (length + 1 < replySize) reply[length++] = byte;
+                ReadResult r = ReadByte(fd, &byte, kReadTimeoutMs);
+                if (r == ReadResult::Failed) break;
+                if (r == ReadResult::Silent) {
+                    if (i == 0 && link.echo.load() == EchoMode::Unknown)
+                        link.echo.store(EchoMode::Silent);
+                    continue;
                 }
-                reply[length] = '\0';
+                framer.Feed(byte);  // the echo, or the start of something else: kept
             }
         }
+        // No overall limit unless the caller sets one: a network operation may take many
+        // seconds. Closing the port or a cancel is what ends a wait for a card that never
+        // answers.
+        int waited = 0;
+        bool cancelled = false;
+        while (!failed && !framer.HeardAnything()) {
+            Sleep(link, kAnswerPollMs);
+            waited += kAnswerPollMs;
+            if (link.portState.load() == 0 || TakeCancel(options) ||
+                (options.answerLimitMs > 0 && waited >= options.answerLimitMs)) {
+                cancelled = true;
+                break;
+            }
+            char byte;
+            ReadResult r = ReadByte(fd, &byte, kReadTimeoutMs);
+            if (r == ReadResult::Failed) failed = true;
+            if (r == ReadResult::Byte) framer.Feed(byte);
+            waited += r == ReadResult::Silent ? kReadTimeoutMs : 0;
+        }
+        if (cancelled && options.abortOnCancel && link.portState.load() != 0) {
+            // Any byte takes a dial back; its result ("NO CARRIER") is read here so that it
+            // does not answer the next command.
+            if (WriteByte(fd, '\r')) {
+                char byte;
+                for (int silent = 0; !framer.Complete() && silent < kAbortResultMs;) {
+                    ReadResult r = ReadByte(fd, &byte, kReadTimeoutMs);
+                    if (r == ReadResult::Failed) break;
+                    if (r == ReadResult::Byte)
+                        framer.Feed(byte);
+                    else
+                        silent += kReadTimeoutMs;
+                }
+            }
+        }
+        if (cancelled) failed = true;
+        // The rest, until the card falls silent after its final result. Unsolicited lines
+        // that came first are not the reply: their silence goes on counting as the wait.
+        int silentMs = 0;
+        while (!failed) {
+            char byte;
+            ReadResult r = ReadByte(fd, &byte, kReadTimeoutMs);
+            if (r == ReadResult::Failed) {
+                failed = true;
+                break;
+            }
+            if (r == ReadResult::Byte) {
+                framer.Feed(byte);
+                silentMs = 0;
+                continue;
+            }
+            if (framer.Complete()) break;
+            silentMs += kReadTimeoutMs;
+            if (link.portState.load() == 0 || TakeCancel(options)) {
+                failed = true;
+                break;
+            }
+            const bool begun = framer.Length() > 0;
+            if (begun && silentMs >= kMissingResultMs) break;
+            if (!begun && options.answerLimitMs > 0 && waited + silentMs >= options.answerLimitMs)
+                break;
+        }
+        if (!failed) {
+            if (framer.EchoSeen())
+                link.echo.store(EchoMode::Echoes);
+            else if (link.echo.load() == EchoMode::Unknown && framer.Length() > 0)
+                link.echo.store(EchoMode::Silent);
+            link.partialLine = framer.PartialLine();
+        }
     }
-    PortUnlock(link);
+    if (!options.lockHeld) PortUnlock(link);
+    QueueUnsolicited(link, framer.TakeUnsolicited());
     if (failed) {
         reply[0] = '\0';
         return 0;
     }
-    HandleUnsolicited(link, reply, length);
-    return length;
+    const unsigned length = framer.Length();
+    return length < replySize ? length : static_cast<unsigned>(replySize - 1);
 }
+
+namespace {
 
 // Fills text with the reply's first line of information, converted to UTF-16.
 void FirstLineToWide(char* reply, int length, char16_t* text, size_t textSize) {
@@ -163,13 +275,87 @@ void FirstLineToWide(char* reply, int length, char16_t* text, size_t textSize) {
         text[0] = u'\0';
 }
 
+// Takes in what the card sent by itself while no exchange ran: its unsolicited lines are
+// queued, a line cut by the end of the read waits for the rest.
+void TakeUnsolicitedBytes(Link& link) {
+    if (!PortTryLock(link)) return;
+    std::vector<std::string> lines;
+    {
+        std::shared_lock<std::shared_mutex> io(link.ioGuard);
+        if (link.fd >= 0) {
+            ReplyFramer framer(nullptr, nullptr, 0);
+            framer.ResumeLine(link.partialLine);
+            // The bytes of a line follow each other closely; 20 ms of silence ends the read.
+            ReadInto(link.fd, framer, kInterByteMs, 4096, nullptr);
+            link.partialLine = framer.PartialLine();
+            lines = framer.TakeUnsolicited();
+        }
+    }
+    PortUnlock(link);
+    QueueUnsolicited(link, lines);
+}
+
+// Waits until the card sends something, the listener is woken, or the time is up; returns
+// early in each case. While an exchange holds the port its bytes are the exchange's: the wait
+// then is for the port to come free.
+void ListenerWait(Link& link, std::chrono::steady_clock::time_point until) {
+    for (;;) {
+        const auto now = std::chrono::steady_clock::now();
+        if (now >= until || link.portState.load() == 0) return;
+        const int left =
+            static_cast<int>(
+                std::chrono::duration_cast<std::chrono::milliseconds>(until - now).count()) +
+            1;
+        if (link.portState.load() == 2) {
+            std::unique_lock<std::mutex> lock(link.portMutex);
+            link.portChanged.wait_for(lock, std::chrono::milliseconds(left),
+                                      [&] { return link.portState.load() != 2; });
+            continue;
+        }
+        pollfd p[2] = {{link.fd, POLLIN, 0}, {link.wakeFd, POLLIN, 0}};
+        const int ready = poll(p, link.wakeFd >= 0 ? 2 : 1, left);
+        if (ready < 0 && errno == EINTR) continue;
+        if (ready <= 0) return;
+        if (p[1].revents & POLLIN) {
+            uint64_t count;
+            (void)!read(link.wakeFd, &count, sizeof count);
+            return;
+        }
+        if (p[0].revents & (POLLHUP | POLLERR | POLLNVAL)) {
+            // A vanished device: nothing to read until the card watch closes the port.
+            Sleep(link, kAnswerPollMs);
+            continue;
+        }
+        if (p[0].revents & POLLIN) return;
+    }
+}
+
 void ListenerThread(Link* link) {
+    using std::chrono::steady_clock;
     bool callSeen = false;
+    int silentPolls = 0;
+    auto nextPoll = steady_clock::now();
     while (link->portState.load() > 0) {
         if (link->portState.load() != 2) {
-            if (link->events) link->events->DispatchQueued();
+            TakeUnsolicitedBytes(*link);
+            int rings = 0;
+            if (link->events) link->events->DispatchAll(&rings);
+            // A ring taken in is a call seen: if the caller gives up before a poll finds the
+            // call, the next empty call list still ends it.
+            if (rings > 0) callSeen = true;
+        }
+        if (link->portState.load() == 1 && steady_clock::now() >= nextPoll) {
+            nextPoll = steady_clock::now() + std::chrono::milliseconds(link->listenerPassMs);
             int state = -1, mode = -1;
-            if (QueryCallState(*link, &state, &mode)) {
+            const int calls = QueryCallState(*link, &state, &mode);
+            if (calls < 0 && link->portState.load() > 0) {
+                // No answer at all: after a few passes the card is taken for gone.
+                if (++silentPolls == kSilentPollsGone && link->postToMain)
+                    link->postToMain(kMsgCardSilent);
+            } else if (calls >= 0) {
+                silentPolls = 0;
+            }
+            if (calls == 1) {
                 if (state == 0 && mode == 0) {
                     if (link->postToMain) link->postToMain(kMsgCallActive);
                     callSeen = true;
@@ -178,18 +364,18 @@ void ListenerThread(Link* link) {
                     static const char kRing[] = "\r\n+CRING: VOICE\r\n\r\nOK\r\n";
                     if (link->events) {
                         link->events->UnsolicitedScan(kRing, sizeof kRing - 1);
-                        link->events->DispatchQueued();
+                        link->events->DispatchAll(nullptr);
                     }
                     callSeen = true;
                 }
-            } else if (callSeen) {
+            } else if (calls == 0 && callSeen) {
+                // Only a clean "no call" ends a call: a damaged reply says nothing.
                 if (link->postToMain) link->postToMain(kMsgCallListEmpty);
                 callSeen = false;
             }
+            continue;  // what came in during the poll is taken in at once
         }
-        // Sleep in small steps so that closing the port ends the thread promptly.
-        for (int waited = 0; waited < 1000 && link->portState.load() > 0; waited += 100)
-            Sleep(*link, 100);
+        ListenerWait(*link, nextPoll);
     }
 }
 
@@ -238,13 +424,25 @@ int PortOpenDevice(Link& link, const char* device) {
     int dtr = TIOCM_DTR;
     ioctl(fd, TIOCMBIC, &dtr);
 
-    link.fd = fd;
-    link.portState.store(1);
+    if (link.wakeFd < 0) link.wakeFd = eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK);
+    {
+        std::lock_guard<std::mutex> lock(link.portMutex);
+        link.fd = fd;
+        link.echo.store(EchoMode::Unknown);
+        link.partialLine.clear();
+        ++link.openCount;
+        link.servingTicket = link.nextTicket;  // nobody from an earlier opening is waiting
+        link.portState.store(1);
+    }
     if (!ModemInit(link)) {
         PortClose(link);
         return 0;
     }
     link.firmwareVersion = GetFirmwareVersion(link, nullptr, 0);
+    // Operators in numeric form where the modem lets the client choose; the card always
+    // reports them so, and a refusal changes nothing.
+    char reply[256];
+    AtCommandWithin(link, "AT+COPS=3,2\r", reply, sizeof reply, kQueryAnswerLimitMs);
     link.listener = std::thread(ListenerThread, &link);
     return 1;
 }
@@ -254,6 +452,8 @@ void PortClose(Link& link) {
         std::lock_guard<std::mutex> lock(link.portMutex);
         link.portState.store(0);
     }
+    link.portChanged.notify_all();
+    WakeListener(link);
     if (link.listener.joinable() && link.listener.get_id() != std::this_thread::get_id())
         link.listener.join();
     std::unique_lock<std::shared_mutex> io(link.ioGuard);
@@ -266,39 +466,60 @@ void PortClose(Link& link) {
 int PortTryLock(Link& link) {
     if (!LockWithin(link.portMutex, kMutexWaitMs)) return 0;
     std::lock_guard<std::mutex> lock(link.portMutex, std::adopt_lock);
-    if (link.portState.load() != 1) return 0;
+    // Free and nobody waiting for a turn.
+    if (link.portState.load() != 1 || link.servingTicket != link.nextTicket) return 0;
+    ++link.nextTicket;
+    ++link.servingTicket;
     link.portState.store(2);
     return 1;
 }
 
 int PortLock(Link& link) {
+    std::unique_lock<std::mutex> lock(link.portMutex);
+    const unsigned long opening = link.openCount;
+    const unsigned long ticket = link.nextTicket++;
     for (;;) {
-        {
-            std::lock_guard<std::mutex> lock(link.portMutex);
-            int state = link.portState.load();
-            if (state == 1) {
-                link.portState.store(2);
-                return 1;
-            }
-            if (state == 0) return 0;
+        const int state = link.portState.load();
+        if (state == 0 || link.openCount != opening) {
+            // The port closed: nobody waits for it any more.
+            if (link.servingTicket <= ticket) link.servingTicket = ticket + 1;
+            link.portChanged.notify_all();
+            return 0;
         }
-        Sleep(link, kLockRetryMs);
+        if (state == 1 && link.servingTicket == ticket) {
+            ++link.servingTicket;
+            link.portState.store(2);
+            return 1;
+        }
+        link.portChanged.wait(lock);
     }
 }
 
 void PortUnlock(Link& link) {
     if (!LockWithin(link.portMutex, kMutexWaitMs)) return;
-    std::lock_guard<std::mutex> lock(link.portMutex, std::adopt_lock);
-    // A port closed meanwhile stays closed.
-    if (link.portState.load() == 2) link.portState.store(1);
+    {
+        std::lock_guard<std::mutex> lock(link.portMutex, std::adopt_lock);
+        // A port closed meanwhile stays closed.
+        if (link.portState.load() == 2) link.portState.store(1);
+    }
+    link.portChanged.notify_all();
 }
 
 unsigned AtCommand(Link& link, const char* command, char* reply, size_t replySize) {
-    return Transact(link, PortLock, command, reply, replySize);
+    return AtExchange(link, command, reply, replySize, ExchangeOptions{});
 }
 
 unsigned AtCommandTry(Link& link, const char* command, char* reply, size_t replySize) {
-    return Transact(link, PortTryLock, command, reply, replySize);
+    ExchangeOptions options;
+    options.tryLock = true;
+    return AtExchange(link, command, reply, replySize, options);
+}
+
+unsigned AtCommandWithin(Link& link, const char* command, char* reply, size_t replySize,
+                         int limitMs) {
+    ExchangeOptions options;
+    options.answerLimitMs = limitMs;
+    return AtExchange(link, command, reply, replySize, options);
 }
 
 unsigned AtReadPending(Link& link, char* buffer, size_t limit) {
@@ -306,16 +527,23 @@ unsigned AtReadPending(Link& link, char* buffer, size_t limit) {
     buffer[0] = '\0';
     if (link.portState.load() == 0 || !PortTryLock(link)) return 0;
     unsigned count = 0;
+    std::vector<std::string> lines;
     {
         std::shared_lock<std::shared_mutex> io(link.ioGuard);
         // Only what is already there: this drain must not add a wait to every command.
+        ReplyFramer framer(nullptr, nullptr, 0);
+        framer.ResumeLine(link.partialLine);
         char byte;
-        while (link.fd >= 0 && count < limit && ReadByte(link.fd, &byte, 0) == ReadResult::Byte)
+        while (link.fd >= 0 && count < limit && ReadByte(link.fd, &byte, 0) == ReadResult::Byte) {
             buffer[count++] = byte;
+            framer.Feed(byte);
+        }
         buffer[count] = '\0';
+        link.partialLine = framer.PartialLine();
+        lines = framer.TakeUnsolicited();
     }
     PortUnlock(link);
-    HandleUnsolicited(link, buffer, count);
+    QueueUnsolicited(link, lines);
     return count;
 }
 
@@ -328,14 +556,17 @@ int AtFinalResult(const char* reply, int length) {
 int ModemInit(Link& link) {
     for (const char* command : kInitCommands) {
         char reply[256];
-        if (AtCommand(link, command, reply, sizeof reply) == 0) return 0;
+        // A card that does not answer its start-up is not waited for: the watch tries again.
+        // Any card answers these at once; the window waits meanwhile, so the wait is short.
+        if (AtCommandWithin(link, command, reply, sizeof reply, kInitAnswerLimitMs) == 0) return 0;
     }
     return 1;
 }
 
 float GetFirmwareVersion(Link& link, char16_t* text, size_t textSize) {
     char reply[256];
-    int length = static_cast<int>(AtCommand(link, "AT+GMR\r", reply, sizeof reply));
+    int length = static_cast<int>(
+        AtCommandWithin(link, "AT+GMR\r", reply, sizeof reply, kQueryAnswerLimitMs));
     if (length == 0) return 0.0f;
     float version = 0.0f;
     int at = FindPattern(0, "SW", 2, reply, length);
@@ -347,10 +578,12 @@ float GetFirmwareVersion(Link& link, char16_t* text, size_t textSize) {
 int GetCardIdentity(Link& link, char16_t* manufacturer, size_t manufacturerSize, char16_t* model,
                     size_t modelSize, char16_t* firmware, size_t firmwareSize) {
     char reply[256];
-    int length = static_cast<int>(AtCommand(link, "AT+GMI\r", reply, sizeof reply));
+    int length = static_cast<int>(
+        AtCommandWithin(link, "AT+GMI\r", reply, sizeof reply, kQueryAnswerLimitMs));
     if (length == 0) return 0;
     FirstLineToWide(reply, length, manufacturer, manufacturerSize);
-    length = static_cast<int>(AtCommand(link, "AT+GMM\r", reply, sizeof reply));
+    length = static_cast<int>(
+        AtCommandWithin(link, "AT+GMM\r", reply, sizeof reply, kQueryAnswerLimitMs));
     if (length == 0) return 0;
     FirstLineToWide(reply, length, model, modelSize);
     GetFirmwareVersion(link, firmware, firmwareSize);
@@ -359,7 +592,10 @@ int GetCardIdentity(Link& link, char16_t* manufacturer, size_t manufacturerSize,
 
 int GetSignalBars(Link& link) {
     char reply[256];
-    int length = static_cast<int>(AtCommandTry(link, "AT+CSQ\r", reply, sizeof reply));
+    ExchangeOptions options;
+    options.tryLock = true;
+    options.answerLimitMs = kQueryAnswerLimitMs;
+    int length = static_cast<int>(AtExchange(link, "AT+CSQ\r", reply, sizeof reply, options));
     if (length == 0) return -1;
     int quality = 0, errorRate = 0;
     int at = FindPattern(0, "+CSQ: ", 6, reply, length);
@@ -374,7 +610,8 @@ int GetSignalBars(Link& link) {
 
 int GetOperatorName(Link& link, char16_t* name, size_t nameSize) {
     char reply[256];
-    int length = static_cast<int>(AtCommand(link, "AT+COPS?\r", reply, sizeof reply));
+    int length = static_cast<int>(
+        AtCommandWithin(link, "AT+COPS?\r", reply, sizeof reply, kQueryAnswerLimitMs));
     if (length == 0) return 0;
     int at = FindPattern(0, ",2,", 3, reply, length);
     uint32_t code = at >= 1 ? static_cast<uint32_t>(std::atoi(reply + at + 3)) : 0;
@@ -387,7 +624,10 @@ int GetOperatorName(Link& link, char16_t* name, size_t nameSize) {
 
 int GetSpeakerVolume(Link& link) {
     char reply[256];
-    int length = static_cast<int>(AtCommandTry(link, "AT+CLVL?\r", reply, sizeof reply));
+    ExchangeOptions options;
+    options.tryLock = true;
+    options.answerLimitMs = kQueryAnswerLimitMs;
+    int length = static_cast<int>(AtExchange(link, "AT+CLVL?\r", reply, sizeof reply, options));
     if (length == 0) return -1;
     int at = FindPattern(0, "+CLVL:", 6, reply, length);
     if (at < 0) return -1;
@@ -401,16 +641,27 @@ int GetSpeakerVolume(Link& link) {
 int SetSpeakerVolume(Link& link, int level) {
     char command[32], reply[256];
     std::snprintf(command, sizeof command, "AT+CLVL=%d\r", level);
-    int length = static_cast<int>(AtCommand(link, command, reply, sizeof reply));
+    int length =
+        static_cast<int>(AtCommandWithin(link, command, reply, sizeof reply, kQueryAnswerLimitMs));
     return length == 0 ? -1 : AtFinalResult(reply, length);
 }
 
 int QueryCallState(Link& link, int* state, int* mode) {
     char reply[256];
-    int length = static_cast<int>(AtCommand(link, "AT+CLCC\r", reply, sizeof reply));
-    if (length == 0) return 0;
+    int length = static_cast<int>(
+        AtCommandWithin(link, "AT+CLCC\r", reply, sizeof reply, kQueryAnswerLimitMs));
+    if (length == 0) return -1;
     int at = FindPattern(0, "+CLCC:", 6, reply, length);
-    if (at < 0) return 0;
+    if (at < 0) {
+        // Only a clean answer means no call: the final OK and nothing else but line ends.
+        int i = 0;
+        while (i < length && (reply[i] == '\r' || reply[i] == '\n'))
+            ++i;
+        if (i + 2 > length || reply[i] != 'O' || reply[i + 1] != 'K') return -1;
+        for (i += 2; i < length; ++i)
+            if (reply[i] != '\r' && reply[i] != '\n') return -1;
+        return 0;
+    }
     const char* end = reply + length;
     const char* p = reply + at + 6;
     while (p < end && *p == ' ')
@@ -418,9 +669,9 @@ int QueryCallState(Link& link, int* state, int* mode) {
     int32_t fields[4];
     for (int i = 0; i < 4; ++i) {
         p = ParseInt(p, end, &fields[i]);
-        if (!p) return 0;
+        if (!p) return -1;
         if (i < 3) {
-            if (*p != ',') return 0;
+            if (*p != ',') return -1;
             ++p;
         }
     }

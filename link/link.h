@@ -3,11 +3,13 @@
 #pragma once
 
 #include <atomic>
+#include <condition_variable>
 #include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <mutex>
 #include <shared_mutex>
+#include <string>
 #include <thread>
 
 #include "link/event_sink.h"
@@ -19,6 +21,13 @@ class SettingsStore;
 
 inline constexpr int kMsgCallActive = 2126;
 inline constexpr int kMsgCallListEmpty = 2127;
+// The card has not answered the listener's call-list poll for kSilentPollsGone passes in a row:
+// the main window treats it as gone, as it does a pulled card.
+inline constexpr int kMsgCardSilent = 2133;
+inline constexpr int kSilentPollsGone = 3;
+
+// Whether the modem echoes what it is sent, as the link has learnt it.
+enum class EchoMode { Unknown, Echoes, Silent };
 
 struct Link {
     Link(SettingsStore& store, DriverRoots driverRoots)
@@ -32,13 +41,23 @@ struct Link {
     EventSink* events = nullptr;                  // unsolicited codes go here; may be null
     std::function<void(int message)> postToMain;  // 2126/2127 for the main window
     std::function<void(int ms)> sleepMs;          // the waits; tests may shorten them
+    int listenerPassMs = 1000;                    // the call-list poll's cadence
 
     int fd = -1;
     // Held only for the instant of testing and changing portState; a transaction owns the port
     // while portState is 2, so a waiting party can give up without blocking for a whole exchange.
     std::mutex portMutex;
+    std::condition_variable portChanged;  // portState or the turn changed
+    // Waiting parties take the port in the order they asked for it (a ticket each), so the
+    // listener's call-list poll is never starved by a stream of other commands.
+    unsigned long nextTicket = 0, servingTicket = 0, openCount = 0;
     std::atomic<int> portState{0};  // 0 closed, 1 open and free, 2 in use
     float firmwareVersion = 0.0f;
+    std::atomic<EchoMode> echo{EchoMode::Unknown};
+    // The start of an unsolicited line that a read ended in the middle of (guarded by the port).
+    std::string partialLine;
+    // Written to wake the listener: an unsolicited record was queued, or the port closes.
+    int wakeFd = -1;
 
     // Readers hold it shared while they touch fd; closing takes it exclusively so that the
     // descriptor is never closed under a read.
@@ -60,13 +79,42 @@ int PortTryLock(Link& link);
 int PortLock(Link& link);
 void PortUnlock(Link& link);
 
+// How one exchange takes the port and how long it waits for the card's answer.
+struct ExchangeOptions {
+    bool tryLock = false;  // give up (0) when the port is busy instead of waiting for it
+    // The longest wait for the first byte of the reply; 0 waits until the port closes, for a
+    // network operation that may take many seconds.
+    int answerLimitMs = 0;
+    // Set to 1 by another thread to end the wait for the reply (taken and cleared here).
+    std::atomic<int>* cancel = nullptr;
+    // The caller already owns the port (PortLock) and keeps it afterwards: for exchanges that
+    // must follow each other with nothing between, such as a message's text after its prompt.
+    bool lockHeld = false;
+    // A cancelled wait takes the command back (a byte sent, its result read): for a dial.
+    bool abortOnCancel = false;
+};
+
+// The answer wait of the exchanges that any modem answers at once (queries, start-up, hang-up).
+inline constexpr int kQueryAnswerLimitMs = 3000;
+
 // One exchange with the card. Returns the number of bytes read into reply (NUL-terminated,
 // at most replySize - 1; what the card sends beyond that is read and dropped), 0 on failure.
+// The reply holds the command's own lines only: the echo and unsolicited lines are taken out
+// (the latter go to the event sink). It ends when the card falls silent after its final result.
+unsigned AtExchange(Link& link, const char* command, char* reply, size_t replySize,
+                    const ExchangeOptions& options);
+// Waits for the port and for the reply as long as it takes.
 unsigned AtCommand(Link& link, const char* command, char* reply, size_t replySize);
 // The same, but gives up at once (0) when the port stays busy for 5 s.
 unsigned AtCommandTry(Link& link, const char* command, char* reply, size_t replySize);
+// Waits for the port, but for the reply's first byte at most limitMs.
+unsigned AtCommandWithin(Link& link, const char* command, char* reply, size_t replySize,
+                         int limitMs);
 // Bytes already waiting on the port, at most limit (buffer holds limit + 1).
 unsigned AtReadPending(Link& link, char* buffer, size_t limit);
+
+// Wakes the listener so that it dispatches what was queued at once.
+void WakeListener(Link& link);
 
 // Final-result code of a reply: 0 OK, 3 NO CARRIER, 4 ERROR, 7 BUSY, 8 NO ANSWER,
 // 13 DELAYED, 14 BLACKLISTED, 16 CARRIER, -1 none.
@@ -81,8 +129,9 @@ int GetOperatorName(Link& link, char16_t* name, size_t nameSize);
 int GetSpeakerVolume(Link& link);
 int SetSpeakerVolume(Link& link, int level);
 
-// "AT+CLCC": 1 with the state and mode of the first listed call; 0 when there is no call,
-// no reply or a malformed line.
+// "AT+CLCC": 1 with the state and mode of the first listed call; 0 when the card says there
+// is no call (a clean final OK without a call line); -1 when there was no reply or it was
+// damaged, which says nothing about the call.
 int QueryCallState(Link& link, int* state, int* mode);
 
 }  // namespace vqm

@@ -69,7 +69,12 @@ MainWindow::MainWindow(ShellContext& context, std::array<ViewFactory, kViewCount
 
     // The listener's call-list news, sent to the window as the card watch's thread expects.
     context_.link.postToMain = [this](int msg) {
-        messages_.Send(this, static_cast<unsigned>(msg), 0, 0);
+        // A silent card closes the link, which joins the listener: that news must not keep
+        // the listener waiting for its own end.
+        if (msg == kMsgCardSilent)
+            messages_.Post(this, static_cast<unsigned>(msg), 0, 0);
+        else
+            messages_.Send(this, static_cast<unsigned>(msg), 0, 0);
     };
     notifier_ = new Notifier(
         [this](int id) {
@@ -197,6 +202,12 @@ long MainWindow::OnMessage(unsigned msg, long wParam, long lParam) {
         case kMsgCallListEmpty:
             if (View* dialPad = ViewAt(kViewDialPad)) dialPad->OnMessage(msg, wParam, lParam);
             return 0;
+        case kMsgCardSilent:
+            if (app_.cardState == 2 && !shutDown_) {
+                Log("card", u"silent: taken for gone");
+                watch_.SetCardState(1);
+            }
+            return 0;
         case kMsgBringForward:
             Log("foreground", u"asked by a second start");
             Foreground();
@@ -205,6 +216,10 @@ long MainWindow::OnMessage(unsigned msg, long wParam, long lParam) {
             return 0;
     }
 }
+
+namespace {
+constexpr int kExitHangUpLimitMs = 1000;
+}  // namespace
 
 void MainWindow::OnCommand(int id) {
     if (id >= kCmdViewFirst && id < kCmdViewFirst + 6) {
@@ -221,8 +236,9 @@ void MainWindow::OnCommand(int id) {
             break;
         case kCmdExit:
             if (card_.CompanionExists() && card_.SendCompanion(kMsgCardPowerQuery) == 1L) {
+                // A card that does not answer does not hold up the exit.
                 char reply[256];
-                AtCommand(context_.link, "ATH\r", reply, sizeof reply);
+                AtCommandWithin(context_.link, "ATH\r", reply, sizeof reply, kExitHangUpLimitMs);
             }
             Shutdown();
             break;

@@ -30,8 +30,13 @@ class RecordingSink : public EventSink {
         seen_.append(text, static_cast<size_t>(length));
         return 0;
     }
-    int DispatchOldest() override { return 0; }
-    int DispatchQueued() override { return 0; }
+    int QueueLine(const char* line, int length) override {
+        std::lock_guard<std::mutex> lock(mutex_);
+        seen_.append(line, static_cast<size_t>(length));
+        seen_ += "\r\n";
+        return 0;
+    }
+    int DispatchAll(int*) override { return 0; }
     bool Saw(const std::string& text) {
         std::lock_guard<std::mutex> lock(mutex_);
         return seen_.find(text) != std::string::npos;
