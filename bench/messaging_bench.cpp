@@ -44,8 +44,8 @@ int RefreshFigure(int baud, int iterations) {
         if (card.Control("capacity " + std::to_string(kSimMessages)) != "OK") return false;
         // The demo SIM's four, then deliveries up to the capacity.
         for (int i = 5; i <= kSimMessages; ++i)
-            if (card.Control("deliver +4477009" + std::to_string(10000 + i) +
-                             " Message number " + std::to_string(i) +
+            if (card.Control("deliver +4477009" + std::to_string(10000 + i) + " Message number " +
+                             std::to_string(i) +
                              " of the full SIM, long enough to be a typical text") != "OK")
                 return false;
         return true;
@@ -107,7 +107,9 @@ int ListingFigure(int iterations) {
                 vqm::SmsRecord record{};
                 record.index = i;
                 std::snprintf(record.status, sizeof record.status, "%s",
-                              i % 3 == 0 ? "PDA DRAFT" : i % 3 == 1 ? "PDA PDA" : "STO SENT");
+                              i % 3 == 0   ? "PDA DRAFT"
+                              : i % 3 == 1 ? "PDA PDA"
+                                           : "STO SENT");
                 std::snprintf(record.number, sizeof record.number, "+30697%07d", i);
                 std::snprintf(record.date, sizeof record.date, "%02d:%02d:%02d,%02d/%02d/20%02d",
                               i % 24, i % 60, (i * 7) % 60, 1 + i % 28, 1 + i % 12, i % 30);

@@ -95,8 +95,8 @@ bool ReadList(SettingsStore& settings, const char16_t* name, std::string* list) 
     char16_t wide[kMaxSettingLength + 1];
     if (!GetSettingString(settings, name, wide, sizeof wide / sizeof wide[0])) return false;
     char narrow[kMaxSettingLength + 1];
-    const int length = WideToNarrow(wide, narrow, static_cast<int>(WideLength(wide, kMaxSettingLength)),
-                                    sizeof narrow);
+    const int length = WideToNarrow(
+        wide, narrow, static_cast<int>(WideLength(wide, kMaxSettingLength)), sizeof narrow);
     list->assign(narrow, static_cast<size_t>(length));
     return true;
 }
@@ -122,8 +122,8 @@ std::vector<ListEntry> WalkList(const std::string& list) {
         int length = 0;
         const char* next = ParseQuoted(p, end, field, sizeof field, &length);
         if (!next) break;
-        entries.push_back({std::atoi(field), static_cast<size_t>(p - begin),
-                           static_cast<size_t>(next - begin)});
+        entries.push_back(
+            {std::atoi(field), static_cast<size_t>(p - begin), static_cast<size_t>(next - begin)});
         p = next;
     }
     return entries;
@@ -361,7 +361,8 @@ int IndexListContains(SettingsStore& settings, const char16_t* name, int locatio
 int IndexListAdd(SettingsStore& settings, const char16_t* name, int location) {
     if (location < 1) return 0;
     std::string list;
-    if (!ReadList(settings, name, &list)) return WriteList(settings, name, QuotedLocation(location));
+    if (!ReadList(settings, name, &list))
+        return WriteList(settings, name, QuotedLocation(location));
     for (const ListEntry& entry : WalkList(list))
         if (entry.location == location) return 1;
     return WriteList(settings, name, list + QuotedLocation(location));
@@ -490,7 +491,8 @@ int RecordBodyFromText(const char16_t* text, size_t count, SmsRecord* record) {
     const size_t bytes = count * sizeof(char16_t);
     if (CanUseGsmAlphabet(text, bytes)) {
         record->coding = 0;
-        record->length = WideToNarrow(text, record->text, static_cast<int>(count), sizeof record->text);
+        record->length =
+            WideToNarrow(text, record->text, static_cast<int>(count), sizeof record->text);
     } else {
         record->coding = 8;
         record->length = TextToUcs2Hex(text, std::min(count, kUcs2Room) * sizeof(char16_t),
@@ -547,15 +549,16 @@ int ImportPcMessages(MessageStore& store) {
         } else {
             record.coding = 8;
             const size_t units = std::min<size_t>(static_cast<size_t>(count), kUcs2Room);
-            record.length = TextToUcs2Hex(wide, units * sizeof(char16_t), record.text,
-                                          sizeof record.text);
+            record.length =
+                TextToUcs2Hex(wide, units * sizeof(char16_t), record.text, sizeof record.text);
         }
         if (StoreAppend(store, kFolderLocal, record)) ++taken;
     }
     std::fclose(file);
     // An older backup is never replaced: the file then stays and is taken in again next time.
     std::error_code error;
-    if (!std::filesystem::exists(path + ".bak", error)) std::rename(path.c_str(), (path + ".bak").c_str());
+    if (!std::filesystem::exists(path + ".bak", error))
+        std::rename(path.c_str(), (path + ".bak").c_str());
     return taken;
 }
 

@@ -34,8 +34,8 @@ inline constexpr char16_t kNewIdx[] = u"NewIdx";
 inline constexpr char16_t kUnreadIdx[] = u"UnreadIdx";
 
 // The SMS Folder's pages; a page's paste number is its index plus 1.
-inline constexpr int kPageInbox = 0, kPageOutbox = 1, kPageSent = 2, kPageDraft = 3,
-                     kPagePda = 4, kPageCount = 5;
+inline constexpr int kPageInbox = 0, kPageOutbox = 1, kPageSent = 2, kPageDraft = 3, kPagePda = 4,
+                     kPageCount = 5;
 
 // One entry of the transfer file: two header words (always written 0; a 1 in the first would
 // mark a cut, the second naming the page it was cut from) and the record.

@@ -16,7 +16,7 @@ namespace vqm {
 namespace {
 
 constexpr const char16_t* kPageTitles[kPageCount] = {u"Inbox", u"Outbox", u"Sent", u"Draft",
-                                                      u"PDA"};
+                                                     u"PDA"};
 
 bool StatusIs(const SmsRecord& record, const char* word) {
     return std::strncmp(record.status, word, std::strlen(word)) == 0;
@@ -226,8 +226,7 @@ int PasteIntoPage(MessageStore& store, Link& link, int page, const FolderUi& ui)
     for (const ClipboardEntry& entry : entries) {
         SmsRecord record = entry.record;
         // A cut takes the message out of the page it came from first.
-        if (entry.cut == 1 &&
-            !StoreDelete(store, FolderOfPage(entry.sourcePage - 1), record.index))
+        if (entry.cut == 1 && !StoreDelete(store, FolderOfPage(entry.sourcePage - 1), record.index))
             break;
         switch (page) {
             case kPageInbox:
@@ -271,8 +270,8 @@ int DeleteMessages(MessageStore& store, Link& link, const std::vector<FolderRow>
     for (const FolderRow& row : rows) {
         bool ok = true;
         // A concatenated message goes with all its parts.
-        const std::vector<int> indices = row.parts.empty() ? std::vector<int>{row.record.index}
-                                                           : row.parts;
+        const std::vector<int> indices =
+            row.parts.empty() ? std::vector<int>{row.record.index} : row.parts;
         for (int index : indices) {
             if (row.folder == kFolderSim) {
                 IndexListRemove(store.settings, kUnreadIdx, index);

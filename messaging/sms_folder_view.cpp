@@ -23,9 +23,9 @@ namespace vqm {
 
 namespace {
 
-constexpr const char* kPageClasses[kPageCount] = {
-    "SMSFOLDER_INBOX_PAGE", "SMSFOLDER_OUTBOX_PAGE", "SMSFOLDER_SENT_PAGE",
-    "SMSFOLDER_DRAFT_PAGE", "SMSFOLDER_PDA_PAGE"};
+constexpr const char* kPageClasses[kPageCount] = {"SMSFOLDER_INBOX_PAGE", "SMSFOLDER_OUTBOX_PAGE",
+                                                  "SMSFOLDER_SENT_PAGE", "SMSFOLDER_DRAFT_PAGE",
+                                                  "SMSFOLDER_PDA_PAGE"};
 constexpr size_t kNameSize = 140;
 constexpr int kButtonHeight = 24;
 
@@ -85,7 +85,9 @@ SmsFolderView::SmsFolderView(QWidget* parent, ShellContext& context, PhonebookCa
         ViewRecord record;
         record.caption = PageTitle(page);
         record.className = kPageClasses[page];
-        record.windowProc = [this, page](QWidget* pageParent) { return MakePage(pageParent, page); };
+        record.windowProc = [this, page](QWidget* pageParent) {
+            return MakePage(pageParent, page);
+        };
         pages_.records.push_back(std::move(record));
     }
     CreateTabbedPages(this, kFolderTabId, pages_, QRect(0, 0, width(), height()));
@@ -160,9 +162,8 @@ View* SmsFolderView::MakePage(QWidget* parent, int page) {
     forwards_[page] = button("Forward", kFolderForwardFirstId + page, [this] { Forward(); });
     deletes_[page] = button("Delete", kFolderDeleteFirstId + page, [this] { DeleteSelected(); });
 
-    QObject::connect(list, &QTreeWidget::currentItemChanged, this, [this, page] {
-        ShowSelected(page);
-    });
+    QObject::connect(list, &QTreeWidget::currentItemChanged, this,
+                     [this, page] { ShowSelected(page); });
     return view;
 }
 
@@ -282,7 +283,8 @@ void SmsFolderView::ShowSelected(int page) {
     // A message the program selected for the user stays unread until the user opens it.
     if (selecting_ || !row->unread) return;
     OpenMessage(store_, *row);
-    FolderRow& opened = listing_.pages[page][static_cast<size_t>(row - listing_.pages[page].data())];
+    FolderRow& opened =
+        listing_.pages[page][static_cast<size_t>(row - listing_.pages[page].data())];
     opened.unread = false;
     if (QTreeWidgetItem* item = lists_[page]->currentItem()) item->setIcon(kColumnFrom, QIcon());
     if (listing_.unread[page] > 0) --listing_.unread[page];

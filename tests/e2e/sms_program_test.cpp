@@ -115,7 +115,7 @@ TEST_F(SmsProgramTest, DeliveredMessagesReachTheInboxThroughTheDialPadsNotice) {
     ASSERT_EQ(SendWindowMessage(DialerSocket(), 273, 40001, 0, 2000), 0L);  // DialPad in front
     ASSERT_TRUE(TapUntilShown("sms-shown Inbox: Alice | " + text + " | unread")) << Log();
     EXPECT_TRUE(LogShows("sms-folder Inbox=6 ")) << Log();  // the demo's 3, Hello, bank, long
-    EXPECT_EQ(Log().find("(part "), std::string::npos);  // no part missing
+    EXPECT_EQ(Log().find("(part "), std::string::npos);     // no part missing
 }
 
 }  // namespace

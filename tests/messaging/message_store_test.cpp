@@ -114,12 +114,14 @@ TEST_F(MessageStoreTest, NextIndexFillsBelowTheLowestBeforeGrowing) {
         std::vector<int> indices;
         int next;
     };
-    const Case cases[] = {{{}, 1}, {{1, 2, 3}, 4}, {{5, 9}, 4}, {{2}, 1}, {{1, 7}, 8}, {{9, 1}, 10}};
+    const Case cases[] = {{{}, 1},  {{1, 2, 3}, 4}, {{5, 9}, 4},
+                          {{2}, 1}, {{1, 7}, 8},    {{9, 1}, 10}};
     for (const Case& c : cases) {
         std::remove(Folder(kFolderLocal).c_str());
         for (int index : c.indices)
             ASSERT_EQ(StoreAppend(store_, kFolderLocal, Record(index, "PDA PDA")), 1);
-        EXPECT_EQ(StoreNextIndex(store_, kFolderLocal), c.next) << ::testing::PrintToString(c.indices);
+        EXPECT_EQ(StoreNextIndex(store_, kFolderLocal), c.next)
+            << ::testing::PrintToString(c.indices);
     }
 }
 
@@ -253,10 +255,10 @@ TEST_F(MessageStoreTest, DamagedIndexListsAreReadAsFarAsTheyAreSound) {
         int absent;   // one it must not find
     };
     const Case cases[] = {
-        {u"\"3\"\"12", 1, 3, 12},        // the last quote missing
-        {u"\"ab\"\"4\"", 2, 4, 0},       // letters read as 0, the walk goes on
-        {u"\"", 0, -1, 1},               // a lone quote
-        {u"x7\"8\"", 1, 8, 7},           // text outside quotes is passed over
+        {u"\"3\"\"12", 1, 3, 12},   // the last quote missing
+        {u"\"ab\"\"4\"", 2, 4, 0},  // letters read as 0, the walk goes on
+        {u"\"", 0, -1, 1},          // a lone quote
+        {u"x7\"8\"", 1, 8, 7},      // text outside quotes is passed over
         {u"\"99999999999\"\"2\"", 2, 2, 1},
         {u"", 0, -1, 1},
     };
@@ -344,7 +346,9 @@ TEST_F(MessageStoreTest, ImportTakesThePcFileInOnceAndRenamesIt) {
     EXPECT_STREQ(records[3].date, "23:59:58,31/12/2099");
     // The one-half sign has no GSM code: the whole body goes as UCS2.
     EXPECT_EQ(records[3].coding, 8);
-    EXPECT_EQ(std::string(records[3].text, 12), "004700720" "0FC");
+    EXPECT_EQ(std::string(records[3].text, 12),
+              "004700720"
+              "0FC");
 
     // An older backup is never replaced: the file stays and comes in again next time.
     WriteBytes(PcMessagesPath(store_), pc("PDA", "1", "02/03/11,14:25:36", "Again"));
@@ -416,7 +420,8 @@ TEST_F(MessageStoreCardTest, NewMessageIsNotedThenTakenInThroughTheTransferFile)
     store_.hooks.beginBusy = [&] { calls.push_back("busy"); };
     store_.hooks.endBusy = [&] { calls.push_back("idle"); };
     store_.hooks.pasteInto = [&](int page) {
-        calls.push_back("paste" + std::to_string(page) + ":" + std::to_string(ClipboardCount(store_)));
+        calls.push_back("paste" + std::to_string(page) + ":" +
+                        std::to_string(ClipboardCount(store_)));
     };
     store_.hooks.selectFirstUnread = [&] { calls.push_back("select"); };
 

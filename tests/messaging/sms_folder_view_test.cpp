@@ -160,7 +160,8 @@ class SmsFolderViewTest : public ::testing::Test {
         if (!dir) return;  // screenshots only when asked for
         window_->show();
         QApplication::processEvents();
-        EXPECT_TRUE(window_->grab().save(QString::fromStdString(std::string(dir) + "/" + name + ".png")));
+        EXPECT_TRUE(
+            window_->grab().save(QString::fromStdString(std::string(dir) + "/" + name + ".png")));
     }
 
     const testing::TempFolder temp_;
@@ -185,9 +186,9 @@ TEST(NewMessageLine, LocationFollowsTheQuotedMemoryName) {
         const char* memory;
     };
     const Case cases[] = {
-        {"+CMTI: \"SM\",5", 5, "SM"},       {"+CMTI: \"SM\",12\r", 12, "SM"},
-        {"+CMTI: \"SM\"", -1, "SM"},        {"+CMTI: \"SM\" ,3", -1, "SM"},
-        {"+CMTI: SM,3", -1, ""},             {"+CMTI:", -1, ""},
+        {"+CMTI: \"SM\",5", 5, "SM"}, {"+CMTI: \"SM\",12\r", 12, "SM"},
+        {"+CMTI: \"SM\"", -1, "SM"},  {"+CMTI: \"SM\" ,3", -1, "SM"},
+        {"+CMTI: SM,3", -1, ""},      {"+CMTI:", -1, ""},
         {"+CMTI: \"SM\",", -1, "SM"},
     };
     for (const Case& c : cases) {
@@ -230,7 +231,8 @@ TEST_F(SmsFolderViewTest, FirstShowRefreshesTheSimAndAnOpenedMessageIsRead) {
 
     // The Greek message is UCS2 on the SIM.
     Select(kPageInbox, 0);
-    EXPECT_EQ(folder_->Pane(kPageInbox)->toPlainText().toStdU16String(), u"Καλημέρα! Τα λέμε αύριο;");
+    EXPECT_EQ(folder_->Pane(kPageInbox)->toPlainText().toStdU16String(),
+              u"Καλημέρα! Τα λέμε αύριο;");
 
     // The user opening it makes it read in the cache and takes it out of "UnreadIdx".
     Select(kPageInbox, 2);
