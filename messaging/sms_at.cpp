@@ -56,12 +56,21 @@ const char* StatusWord(int stat) {
 // body goes into reply. 0 when either got no reply or no prompt came.
 int PromptAndBody(Link& link, const char* command, char* body, size_t bodyLength, size_t bodySize,
                   char* reply, size_t replySize) {
-    int length = Exchange(link, command, reply, replySize);
-    if (length == 0 || FindPattern(0, ">", 1, reply, length) < 0) return 0;
     if (bodyLength + 2 > bodySize) return 0;
     body[bodyLength] = kCtrlZ;
     body[bodyLength + 1] = '\0';
-    return Exchange(link, body, reply, replySize);
+    // The port stays ours from the command to the text: anything sent between would be taken
+    // into the message.
+    if (!PortLock(link)) return 0;
+    ExchangeOptions held;
+    held.lockHeld = true;
+    int length = static_cast<int>(AtExchange(link, command, reply, replySize, held));
+    if (length > 0 && FindPattern(0, ">", 1, reply, length) >= 0)
+        length = static_cast<int>(AtExchange(link, body, reply, replySize, held));
+    else
+        length = 0;
+    PortUnlock(link);
+    return length;
 }
 
 // "AT+CMGW" and "AT+CMGS" in PDU mode differ only in the command and the confirmation.
