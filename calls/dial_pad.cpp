@@ -50,8 +50,9 @@ int DialPadAppend(DialNumber& number, char16_t c, std::chrono::steady_clock::tim
     if (number.count > 21) return 0;
     if (c == u'0') {
         const bool quick = now - number.lastZero < std::chrono::milliseconds(kDoubleZeroMs);
-        if (number.count > 1 && number.chars[number.count - 1] == u'0' && quick) {
-            number.chars[number.count - 1] = u'+';
+        // A "+" means something only in front of a number: a quick "00" inside one stays "00".
+        if (number.count == 2 && number.chars[1] == u'0' && quick) {
+            number.chars[1] = u'+';
             return 1;
         }
         number.lastZero = now;
@@ -59,7 +60,10 @@ int DialPadAppend(DialNumber& number, char16_t c, std::chrono::steady_clock::tim
     number.chars[number.count] = c;
     ++number.count;
     // The slot of a 20th character is written but never counted: at most 19 are shown.
-    if (number.count == 21) number.count = 20;
+    if (number.count == 21) {
+        number.count = 20;
+        return 0;
+    }
     return 1;
 }
 
@@ -258,9 +262,20 @@ void DialPad::OnCommand(int id) {
             return OnCallKey();
         case kKeyEndId:
             return OnEndKey();
-        case kKeyClearId:
-            if (callState_ == kCallIdle && DialPadBackspace(number_)) RefreshNumberDisplay();
+        case kKeyClearId: {
+            if (callState_ != kCallIdle) return;
+            // Clear edits the number on the display. After a dial or a ring that is not the
+            // buffer, so the shown number becomes the one being typed.
+            const std::u16string shown = ui_.ControlText(kNumberDisplayId);
+            if (shown != DialPadText(number_)) {
+                DialPadEmpty(number_);
+                for (char16_t c : shown.substr(0, 19))
+                    number_.chars[number_.count++] = c;
+            }
+            numberDialled_ = false;
+            if (DialPadBackspace(number_)) RefreshNumberDisplay();
             return;
+        }
         case kKeyContactsId:
             return ui_.SwitchToView(3);
         case kCmdNotificationTapped:
@@ -359,7 +374,8 @@ void DialPad::OnDialResult(int result) {
             HangUpLater();
             break;
     }
-    ui_.EnableControl(kKeyCallId, true);
+    // A dial cut short by the card going leaves the key grey with the rest of the pad.
+    ui_.EnableControl(kKeyCallId, connected_);
 }
 
 void DialPad::OnCallActive() {

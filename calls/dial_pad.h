@@ -62,9 +62,9 @@ struct DialNumber {
     std::chrono::steady_clock::time_point lastZero{};
 };
 
-// Appends c. A "0" right after a "0" typed less than 1000 ms before turns that "0" into "+".
-// At most 19 characters are ever held: the append that would make the 20th is taken back.
-// Returns 1 when the buffer changed.
+// Appends c. A "0" typed less than 1000 ms after a buffer's lone first "0" turns it into "+";
+// anywhere else "00" stays "00". At most 19 characters are ever held: the append that would
+// make the 20th is taken back. Returns 1 when the buffer changed, 0 when it was full.
 int DialPadAppend(DialNumber& number, char16_t c, std::chrono::steady_clock::time_point now);
 // Removes the last character: 1, or 0 when the buffer was empty.
 int DialPadBackspace(DialNumber& number);

@@ -42,19 +42,22 @@ TEST(DialNumberTest, QuickDoubleZeroTypesPlusAndASlowOneTwoZeros) {
     EXPECT_EQ(Typed(u"00", milliseconds(999)), u"+");
     EXPECT_EQ(Typed(u"00", milliseconds(1000)), u"00");
     EXPECT_EQ(Typed(u"0044", milliseconds(300)), u"+44");
-    // The "+" is not a "0": the next quick "0" stands, and the one after pairs with it.
+    // Only a lone first "0" pairs: a "+" inside a number would dial something else.
     EXPECT_EQ(Typed(u"000", milliseconds(100)), u"+0");
-    EXPECT_EQ(Typed(u"0000", milliseconds(100)), u"++");
-    // A "0" after another digit is no pair, however quick.
+    EXPECT_EQ(Typed(u"0000", milliseconds(100)), u"+00");
+    EXPECT_EQ(Typed(u"07700900555", milliseconds(300)), u"07700900555");
+    EXPECT_EQ(Typed(u"01100200", milliseconds(300)), u"01100200");
     EXPECT_EQ(Typed(u"5050", milliseconds(10)), u"5050");
 }
 
 TEST(DialNumberTest, TheTwentiethCharacterNeverAppears) {
     DialNumber number;
     const std::u16string keys = u"1234567890123456789ABCDEFG";
+    int kept = 0;
     for (char16_t c : keys)
-        DialPadAppend(number, c, Time{} + std::chrono::hours(1));
+        kept += DialPadAppend(number, c, Time{} + std::chrono::hours(1));
     EXPECT_EQ(DialPadText(number), keys.substr(0, 19));
+    EXPECT_EQ(kept, 19);  // the refused ones say so, for the pad to show it is full
     EXPECT_EQ(number.count, 20);
     // Taking one back makes room for exactly one more.
     EXPECT_EQ(DialPadBackspace(number), 1);
@@ -174,7 +177,13 @@ TEST(CallerIdTest, TheNumberIsBareUpToFirmware381AndQuotedAfter) {
     const EventRecord quoted = ClipRecord("+CLIP: \"01234\",129");
     EXPECT_EQ(CallerIdNumber(quoted, 4.0f, number, sizeof number), 5);
     EXPECT_STREQ(number, "01234");
-    EXPECT_EQ(CallerIdNumber(quoted, 3.80f, number, sizeof number), 0);
+    // A quoted number is read as such whatever the firmware (a modem that is not the card
+    // reports version 0.0); an international type gives the '+' the number lacks.
+    EXPECT_EQ(CallerIdNumber(quoted, 3.80f, number, sizeof number), 5);
+    EXPECT_EQ(CallerIdNumber(ClipRecord("+CLIP: \"4915112345678\",145,,,,0"), 0.0f, number,
+                             sizeof number),
+              14);
+    EXPECT_STREQ(number, "+4915112345678");
 
     // Never past the record's length or the caller's buffer.
     EventRecord cut = ClipRecord("+CLIP: 5551234");
