@@ -1,10 +1,14 @@
 #include "calls/call_log_view.h"
 
+#include <QApplication>
+#include <QFontInfo>
+#include <QFontMetrics>
 #include <QHeaderView>
 #include <QLabel>
 #include <QMenu>
 #include <QMetaObject>
 #include <QResizeEvent>
+#include <QStyle>
 #include <QTabBar>
 #include <QThread>
 #include <QTreeWidget>
@@ -34,6 +38,32 @@ constexpr PageInfo kPages[kCallLogCount] = {
 
 // The Outlook names are the longest: 128 bytes.
 constexpr size_t kNameSize = 140;
+// Room a list cell keeps beside its text.
+constexpr int kCellPadding = 10;
+constexpr int kMinListPixels = 8;
+
+// The font and the date column of a list as wide as width: the date and a 15-digit
+// international number side by side, room kept for a scroll bar.
+void FitColumns(QTreeWidget* list, int width) {
+    const int room = width - 2 * list->frameWidth() -
+                     list->style()->pixelMetric(QStyle::PM_ScrollBarExtent, nullptr, list) -
+                     2 * kCellPadding;
+    QFont font = QApplication::font(list);
+    int pixels = QFontInfo(font).pixelSize();
+    auto need = [&font](int size) {
+        font.setPixelSize(size);
+        const QFontMetrics metrics(font);
+        return metrics.horizontalAdvance("00:00:00,00/00/0000") +
+               metrics.horizontalAdvance("+000000000000000");
+    };
+    while (pixels > kMinListPixels && need(pixels) > room)
+        --pixels;
+    font.setPixelSize(pixels);
+    list->setFont(font);
+    list->setColumnWidth(
+        kColumnDateTime,
+        QFontMetrics(font).horizontalAdvance("00:00:00,00/00/0000") + kCellPadding);
+}
 // Sort keys are compared on at most this many characters.
 constexpr int kSortTextLength = 32;
 
@@ -121,8 +151,12 @@ QTreeWidget* CallLogView::MakeList(QWidget* page, int log) {
     SetControlId(list, kCallLogListFirstId + log - 1);
     list->setColumnCount(4);
     list->setHeaderLabels({"Call", "Date & Time", "", ""});
-    list->setColumnWidth(kColumnCall, 95);
-    list->setColumnWidth(kColumnDateTime, 135);
+    // The date takes what its text needs and the call the rest of the width, which holds a
+    // 15-digit international number; a longer one loses its middle, never its ends.
+    // (FitColumns sizes them to the page.)
+    list->header()->setSectionResizeMode(kColumnCall, QHeaderView::Stretch);
+    list->header()->setSectionResizeMode(kColumnDateTime, QHeaderView::Fixed);
+    list->setTextElideMode(Qt::ElideMiddle);
     // The number and the sequence number stay with each row for the commands, unseen.
     list->header()->setMinimumSectionSize(0);
     for (int column : {kColumnNumber, kColumnSequence}) {
@@ -189,6 +223,8 @@ void CallLogView::Relayout() {
         record.rect = QRect(0, top, w, pageHeight);
         if (record.window) record.window->setGeometry(record.rect);
     }
+    for (QTreeWidget* list : lists_)
+        if (list) FitColumns(list, w);
 }
 
 void CallLogView::resizeEvent(QResizeEvent* event) {

@@ -1,6 +1,7 @@
 #include "calls/dial_pad_view.h"
 
 #include <QAbstractButton>
+#include <QApplication>
 #include <QKeyEvent>
 #include <QLabel>
 #include <QLinearGradient>
@@ -15,6 +16,7 @@
 #include "link/link.h"
 #include "shell/messages.h"
 #include "shell/notifier.h"
+#include "shell/ui_log.h"
 #include "support/local_socket.h"
 
 namespace vqm {
@@ -33,6 +35,11 @@ const QPoint kGaugeAt(197, 35);
 constexpr int kGaugeCellWidth = 8, kGaugeCellHeight = 44;
 const QRect kNoticeIcon(8, 113, 16, 16);
 const QRect kNoticeLine(28, 112, 206, 18);
+// The smallest text a long status or number is shrunk to; still readable on the handheld.
+constexpr int kMinTextPixels = 8;
+// How long the display flashes when the number is full.
+constexpr int kFullFlashMs = 250;
+const QColor kFullFlash(190, 40, 40);
 
 enum class KeyLook { Digit, Call, End, Function, Power };
 
@@ -139,7 +146,7 @@ class PadKey : public QAbstractButton {
 
 QLabel* ReadOnlyText(QWidget* parent, int id, const QRect& where, int pixels, bool bold,
                      Qt::Alignment align, const QColor& ink) {
-    auto* label = new QLabel(parent);
+    auto* label = new FittedText(parent);
     SetControlId(label, id);
     label->setGeometry(where);
     label->setAlignment(align | Qt::AlignVCenter);
@@ -229,6 +236,23 @@ void PaintNoticeIcon(QPainter& p, const QRect& r) {
 
 }  // namespace
 
+QFont FittedText::ShownFont() const {
+    QFont shown = font();
+    const int room = contentsRect().width();
+    while (shown.pixelSize() > kMinTextPixels &&
+           QFontMetrics(shown).horizontalAdvance(text()) > room)
+        shown.setPixelSize(shown.pixelSize() - 1);
+    return shown;
+}
+
+void FittedText::paintEvent(QPaintEvent*) {
+    // The background is filled by the label's own palette before this.
+    QPainter p(this);
+    p.setFont(ShownFont());
+    p.setPen(palette().color(QPalette::WindowText));
+    p.drawText(contentsRect(), static_cast<int>(alignment()) | Qt::TextSingleLine, text());
+}
+
 DialPadView::DialPadView(QWidget* parent, ShellContext& context, CallLog* callLog,
                          PhonebookCaches* caches)
     : View(parent),
@@ -299,8 +323,7 @@ void DialPadView::BuildControls() {
         auto* key = new PadKey(this, label, sub, look);
         SetControlId(key, id);
         key->setGeometry(where);
-        QObject::connect(key, &QAbstractButton::clicked, this,
-                         [this, id] { pad_.OnMessage(kWmCommand, id, 0); });
+        QObject::connect(key, &QAbstractButton::clicked, this, [this, id] { PressKey(id); });
     };
     // The call row: Call, Contacts, Clear, End.
     const int rowY = 134, rowH = 25, fnW = 54;
@@ -366,6 +389,9 @@ long DialPadView::OnMessage(unsigned msg, long wParam, long lParam) {
         case kMsgRunOnPad:
             if (wParam) (*reinterpret_cast<const std::function<void()>*>(wParam))();
             return 0;
+        case kMsgViewShown:
+            TakeFocus();
+            return pad_.OnMessage(msg, wParam, lParam);
         case kMsgCardStateChanged: {
             // The main window tells that the state changed; the state itself is its own.
             const long state = context_.mainWindow ? context_.mainWindow->App().cardState : wParam;
@@ -424,17 +450,64 @@ void DialPadView::keyPressEvent(QKeyEvent* event) {
     if (key == Qt::Key_Backspace) id = kKeyClearId;
     QWidget* control = id ? FindControl(this, id) : nullptr;
     if (control && control->isEnabled()) {
-        pad_.OnMessage(kWmCommand, id, 0);
+        PressKey(id);
         return;
     }
     View::keyPressEvent(event);
 }
 
+void DialPadView::changeEvent(QEvent* event) {
+    View::changeEvent(event);
+    // A busy window is disabled and loses its focus; a window coming back may have none.
+    if (event->type() == QEvent::EnabledChange && isEnabled()) TakeFocus();
+    if (event->type() == QEvent::ActivationChange && isActiveWindow()) {
+        QWidget* focused = window()->focusWidget();
+        if (!focused || (focused != this && !isAncestorOf(focused))) TakeFocus();
+    }
+}
+
+void DialPadView::TakeFocus() {
+    if (isVisible() && isEnabled()) setFocus(Qt::OtherFocusReason);
+}
+
+void DialPadView::PressKey(int id) {
+    const bool typing = (id >= kKeyZeroId && id <= kKeyHashId) && pad_.CallState() == kCallIdle &&
+                        !pad_.NumberWasDialled();
+    const int before = pad_.Number().count;
+    pad_.OnMessage(kWmCommand, id, 0);
+    // The 20th character is kept out; the person typing it learns that the number is full.
+    if (typing && before >= 20 && pad_.Number().count == before) SignalNumberFull();
+}
+
+void DialPadView::SignalNumberFull() {
+    ++fullSignals_;
+    QApplication::beep();
+    auto* display = qobject_cast<QLabel*>(FindControl(this, kNumberDisplayId));
+    if (!display || flashing_) return;
+    flashing_ = true;
+    QPalette flash = display->palette();
+    const QColor normal = flash.color(QPalette::Window);
+    flash.setColor(QPalette::Window, kFullFlash);
+    display->setPalette(flash);
+    QTimer::singleShot(kFullFlashMs, display, [this, display, normal] {
+        QPalette back = display->palette();
+        back.setColor(QPalette::Window, normal);
+        display->setPalette(back);
+        flashing_ = false;
+    });
+}
+
 // DialPadUi
 
 void DialPadView::SetControlText(int id, const std::u16string& text) {
-    if (auto* label = qobject_cast<QLabel*>(FindControl(this, id)))
-        label->setText(QString::fromStdU16String(text));
+    auto* label = qobject_cast<QLabel*>(FindControl(this, id));
+    if (!label) return;
+    const QString shown = QString::fromStdU16String(text);
+    // Every status line a person sees goes into the ui log, so a run can be followed from it.
+    const bool statusLine = id == kStatusLine1Id || id == kStatusLine2Id || id == kStatusLine3Id;
+    if (statusLine && context_.uiLog && !text.empty() && label->text() != shown)
+        context_.uiLog->Line("status", text);
+    label->setText(shown);
 }
 
 std::u16string DialPadView::ControlText(int id) {

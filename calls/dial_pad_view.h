@@ -3,6 +3,7 @@
 // logic is DialPad's; this file draws and hands the window messages over.
 #pragma once
 
+#include <QLabel>
 #include <QPixmap>
 #include <QTimer>
 #include <map>
@@ -23,6 +24,17 @@ class QSlider;
 
 namespace vqm {
 
+// A read-only text of the pad whose font shrinks, down to a floor, until the whole text fits
+// its width: a status or a 19-digit number is never cut. Set through setText like any label.
+class FittedText : public QLabel {
+  public:
+    using QLabel::QLabel;
+    QFont ShownFont() const;
+
+  protected:
+    void paintEvent(QPaintEvent* event) override;
+};
+
 class DialPadView : public View, public DialPadUi {
   public:
     // callLog and caches are the program's shared ones when given; otherwise the view keeps
@@ -40,6 +52,10 @@ class DialPadView : public View, public DialPadUi {
     UnsolicitedEvents& Events() { return *events_; }
     int SignalBars() const { return bars_; }
     bool NotificationIconShown() const { return iconShown_; }
+    // How often a key was refused because the number is full, and whether the display still
+    // shows it.
+    int FullNumberSignals() const { return fullSignals_; }
+    bool DisplayFlashing() const { return flashing_; }
 
     // DialPadUi
     void SetControlText(int id, const std::u16string& text) override;
@@ -70,9 +86,15 @@ class DialPadView : public View, public DialPadUi {
     void paintEvent(QPaintEvent* event) override;
     void mousePressEvent(QMouseEvent* event) override;
     void keyPressEvent(QKeyEvent* event) override;
+    void changeEvent(QEvent* event) override;
 
   private:
     void BuildControls();
+    // A key of the pad, clicked or typed.
+    void PressKey(int id);
+    void SignalNumberFull();
+    // Whenever the pad is in front and usable, typing reaches it.
+    void TakeFocus();
     MessageLayer& Messages();
     void RunOnPadThread(const std::function<void()>& work);
 
@@ -89,6 +111,8 @@ class DialPadView : public View, public DialPadUi {
     QPixmap background_, gauge_;
     int bars_ = 0;
     bool iconShown_ = false;
+    int fullSignals_ = 0;
+    bool flashing_ = false;
     DialPad pad_;  // last: it may call back into everything above while it goes
 };
 

@@ -143,6 +143,10 @@ void MainWindow::BuildMenuBar() {
     helpButton->setPopupMode(QToolButton::InstantPopup);
     menuBar_->addWidget(helpButton);
 
+    // The keyboard belongs to the views: a menu-bar button never keeps the focus.
+    for (QToolButton* button : menuBar_->findChildren<QToolButton*>())
+        button->setFocusPolicy(Qt::NoFocus);
+
     trayMenu_ = new QMenu(this);
     trayMenu_->addAction("What's this?", this, [this] { Command(kCmdWhatsThis); });
     trayMenu_->addAction("Close Dialer", this, [this] { Command(kCmdExit); });
@@ -328,7 +332,10 @@ void MainWindow::Shutdown() {
 
 int MainWindow::MessageBox(const std::u16string& text, const std::u16string& title,
                            unsigned style) {
-    return context_.dialogs.MessageBox(this, text, title, style);
+    const int answer = context_.dialogs.MessageBox(this, text, title, style);
+    // The window the box stood over is the active one again, so the keyboard reaches it.
+    if (isVisible()) activateWindow();
+    return answer;
 }
 
 void MainWindow::ShowStatus(const std::u16string& first, const std::u16string& second) {
@@ -339,7 +346,9 @@ void MainWindow::ShowStatus(const std::u16string& first, const std::u16string& s
     if (auto* line = qobject_cast<QLabel*>(FindControl(dialPad, kStatusSecondId)))
         line->setText(QString::fromStdU16String(second));
     statusShownAt_ = std::chrono::steady_clock::now();
-    Log("status", second.empty() ? first : first + u" | " + second);
+    // As the screen shows it: one line for each status line.
+    Log("status", first);
+    if (!second.empty()) Log("status", second);
 }
 
 void MainWindow::Log(std::string_view what, std::u16string_view text) {

@@ -10,6 +10,7 @@
 #include <QHeaderView>
 #include <QMenu>
 #include <QScrollBar>
+#include <QStyle>
 #include <QTabBar>
 #include <QTreeWidget>
 #include <cstring>
@@ -307,6 +308,45 @@ TEST_F(CallLogViewTest, RefreshesReloadTheFilesAndLookNamesUpAgain) {
     fs::remove(temp_ / "callog1.db");
     view_->OnMessage(kMsgViewShown, 0, 0);
     EXPECT_EQ(view_->List(1)->topLevelItemCount(), 0);
+}
+
+TEST_F(CallLogViewTest, AnInternationalNumberAndItsDateFitAndALongerNumberLosesItsMiddle) {
+    const QString international = "+447700900123456";  // 15 digits
+    const QString longer = "+44770090012345678901234";
+    WriteLog(2, {Record("+447700900123456", "18:42:10,03/07/2024", 1),
+                 Record("+44770090012345678901234", "07:05:59,04/07/2024", 2)});
+    Make();
+    TapTab(1);
+    QApplication::processEvents();
+    QTreeWidget* list = view_->List(2);
+    EXPECT_FALSE(list->horizontalScrollBar()->isVisible());
+    EXPECT_EQ(list->textElideMode(), Qt::ElideMiddle);
+    const QFontMetrics metrics(list->font());
+    const int margins = 2 * (list->style()->pixelMetric(QStyle::PM_FocusFrameHMargin) + 1);
+    auto room = [&](int row, int column) {
+        return list->visualRect(list->model()->index(row, column)).width() - margins;
+    };
+    ASSERT_EQ(list->topLevelItemCount(), 2);
+    for (int row = 0; row < 2; ++row) {
+        const QTreeWidgetItem* item = list->topLevelItem(row);
+        // Both columns lie inside the list's visible width.
+        EXPECT_LE(list->visualRect(list->model()->index(row, kColumnDateTime)).right(),
+                  list->viewport()->width());
+        EXPECT_LE(metrics.horizontalAdvance(item->text(kColumnDateTime)), room(row, 1));
+        const QString number = item->text(kColumnCall);
+        if (number == international) {
+            EXPECT_LE(metrics.horizontalAdvance(number), room(row, 0));
+        } else {
+            ASSERT_EQ(number, longer);
+            const QString shown = metrics.elidedText(number, Qt::ElideMiddle, room(row, 0));
+            EXPECT_NE(shown, number);
+            EXPECT_TRUE(shown.startsWith("+4477")) << shown.toStdString();
+            EXPECT_TRUE(shown.endsWith("234")) << shown.toStdString();
+        }
+    }
+    const std::string folder = VQM_SCREENSHOT_DIR;
+    fs::create_directories(folder);
+    EXPECT_TRUE(view_->grab().save(QString::fromStdString(folder + "/calllog-international.png")));
 }
 
 TEST_F(CallLogViewTest, ScreenshotOfEachPage) {

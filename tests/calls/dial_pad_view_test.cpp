@@ -6,18 +6,27 @@
 #include <gtest/gtest.h>
 
 #include <QAbstractButton>
+#include <QAction>
 #include <QApplication>
+#include <QFontMetrics>
+#include <QKeyEvent>
 #include <QLabel>
 #include <QSlider>
+#include <QTimer>
+#include <algorithm>
 #include <chrono>
 #include <cstdio>
+#include <cstdlib>
 #include <filesystem>
+#include <fstream>
 #include <thread>
 
 #include "cardsim/card_sim.h"
 #include "link/link.h"
 #include "shell/dialogs.h"
 #include "shell/messages.h"
+#include "shell/ui_log.h"
+#include "support/local_socket.h"
 #include "support/settings_store.h"
 #include "support/text.h"
 #include "tests/common/temp_folder.h"
@@ -32,8 +41,12 @@ using std::chrono::milliseconds;
 class SimCardHost : public CardHost {
   public:
     explicit SimCardHost(Link& link) : link_(link) {}
-    bool CompanionExists() override { return false; }
-    std::optional<long> SendCompanion(unsigned) override { return std::nullopt; }
+    bool CompanionExists() override { return companion; }
+    std::optional<long> SendCompanion(unsigned msg) override {
+        if (!companion) return std::nullopt;
+        if (msg == kMsgCardPowerUp) power = 1;
+        return msg == kMsgCardPowerQuery ? power : 1;
+    }
     int OpenLink() override { return PortOpenDevice(link_, device.c_str()); }
     void CloseLink() override {
         if (!messages || !messages->OnOwnerThread()) return PortClose(link_);
@@ -50,6 +63,8 @@ class SimCardHost : public CardHost {
 
     std::string device;
     MessageLayer* messages = nullptr;
+    bool companion = false;  // the card manager is there
+    long power = 1;          // its answer to the power query
 
   private:
     Link& link_;
@@ -69,7 +84,7 @@ class DialPadViewTest : public ::testing::Test {
     }
 
     // The card, the window with the DialPad, the link open and the card connected.
-    void Start(const std::string& firmware = "SW4.00", int dialDelayMs = 200) {
+    void Start(const std::string& firmware = "SW4.00", int dialDelayMs = 200, bool connect = true) {
         cardsim::SimConfig config;
         config.baud = 0;
         config.engine.firmware = firmware;
@@ -91,8 +106,47 @@ class DialPadViewTest : public ::testing::Test {
         pad_ = dynamic_cast<DialPadView*>(window_->ViewAt(kViewDialPad));
         ASSERT_NE(pad_, nullptr);
         pad_->Pad().SetClock([this] { return now_; });
+        if (!connect) return;
         ASSERT_EQ(host_.OpenLink(), 1);
         window_->Watch().SetCardState(2);
+    }
+    // The window on the screen and active, as a person has it.
+    void ShowWindow() {
+        window_->show();
+        window_->activateWindow();
+        ASSERT_TRUE(WaitFor([&] { return window_->isActiveWindow(); }, 5000));
+    }
+    bool PadHasFocus() { return QApplication::focusWidget() == pad_; }
+    // The card has no call any more: the listener cannot report the old one as active once
+    // the pad is idle again.
+    bool CardIdle() {
+        return WaitFor(
+            [&] { return sim_->Control("status").find("call=none") != std::string::npos; });
+    }
+    // A key typed on the keyboard goes wherever the focus is, as it would for a person.
+    void Press(Qt::Key key, const QString& text = {}) {
+        QWidget* target = QApplication::focusWidget();
+        ASSERT_NE(target, nullptr) << "no widget has the keyboard focus";
+        QKeyEvent down(QEvent::KeyPress, key, Qt::NoModifier, text);
+        QKeyEvent up(QEvent::KeyRelease, key, Qt::NoModifier, text);
+        QApplication::sendEvent(target, &down);
+        QApplication::sendEvent(target, &up);
+    }
+    void KeyType(const std::string& digits, milliseconds gap = milliseconds(1500)) {
+        for (char c : digits) {
+            now_ += gap;
+            const Qt::Key key = c == '*'   ? Qt::Key_Asterisk
+                                : c == '#' ? Qt::Key_NumberSign
+                                           : static_cast<Qt::Key>(Qt::Key_0 + (c - '0'));
+            Press(key, QString(QChar(c)));
+        }
+    }
+    FittedText* Line(int id) { return dynamic_cast<FittedText*>(FindControl(pad_, id)); }
+    // The whole text fits its line in the font it is drawn with.
+    bool Fits(int id) {
+        FittedText* line = Line(id);
+        return line && QFontMetrics(line->ShownFont()).horizontalAdvance(line->text()) <=
+                           line->contentsRect().width();
     }
 
     bool WaitFor(const std::function<bool()>& done, int limitMs = 20000) {
@@ -141,6 +195,12 @@ class DialPadViewTest : public ::testing::Test {
         window_->show();
         QApplication::processEvents();
         EXPECT_TRUE(pad_->grab().save(QString::fromStdString(folder + "/" + name + ".png")));
+        // Pictures go where the run asks too, to be looked at.
+        if (const char* shots = std::getenv("VQM_SCREENSHOTS")) {
+            std::filesystem::create_directories(shots);
+            EXPECT_TRUE(pad_->grab().save(
+                QString::fromStdString(std::string(shots) + "/" + name + ".png")));
+        }
     }
     // A SIM phonebook cache holding one contact.
     void KnowContact(const char* number, const char* name) {
@@ -353,6 +413,251 @@ TEST_F(DialPadViewTest, TheCardStateSetsTheVolumeAndGreysThePad) {
     slider->setValue(7);
     EXPECT_TRUE(WaitFor([&] { return pad_->Pad().VolumeLevel() == 7; }));
     EXPECT_TRUE(cardVolume("volume=7"));
+}
+
+TEST_F(DialPadViewTest, ThePadHasTheKeyboardWheneverItComesForward) {
+    Start("SW4.00", 600000);
+    ShowWindow();
+    EXPECT_TRUE(PadHasFocus());
+    KeyType("5");
+    EXPECT_EQ(Text(kNumberDisplayId), u"5");
+
+    // Away and back by the menu bar.
+    window_->Buttons()[kViewCallLog]->trigger();
+    EXPECT_FALSE(pad_->isVisible());
+    window_->Buttons()[kViewDialPad]->trigger();
+    EXPECT_TRUE(PadHasFocus());
+    KeyType("7");
+    EXPECT_EQ(Text(kNumberDisplayId), u"57");
+
+    // The busy look of a connection takes the whole window's focus; it comes back.
+    window_->SetBusyLook(true);
+    window_->SetBusyLook(false);
+    EXPECT_TRUE(PadHasFocus());
+    // A box closed by its button.
+    QTimer::singleShot(100, [] {
+        if (QWidget* box = QApplication::activeModalWidget()) box->close();
+    });
+    window_->MessageBox(u"A question", u"VQM Dialer", 0);
+    ASSERT_TRUE(WaitFor([&] { return PadHasFocus(); }, 5000));
+    Press(Qt::Key_Backspace);
+    EXPECT_EQ(Text(kNumberDisplayId), u"5");
+
+    // A ring brings it forward from another view; Esc turns the caller down.
+    window_->Buttons()[kViewCallLog]->trigger();
+    ASSERT_EQ(sim_->Control("ring 0555123"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return Ringing(); }));
+    EXPECT_TRUE(PadHasFocus());
+    Press(Qt::Key_Escape);
+    EXPECT_EQ(Text(kStatusLine1Id), u"Unanswered");
+    ASSERT_TRUE(CardIdle());
+    LetTheResultGo();
+
+    // Make Call from the Call Log: Esc cancels the dial.
+    window_->Buttons()[kViewCallLog]->trigger();
+    ASSERT_EQ(DialFromAnywhere(context_, u"0123456"), 1);
+    EXPECT_TRUE(PadHasFocus());
+    ASSERT_TRUE(
+        WaitFor([&] { return sim_->Control("status").find("call=dialing") != std::string::npos; }));
+    Press(Qt::Key_Escape);
+    ASSERT_TRUE(WaitFor([&] { return State() == kCallEnded; }));
+    EXPECT_EQ(Text(kStatusLine1Id), u"Call could not be established");
+    ASSERT_TRUE(CardIdle());
+    LetTheResultGo();
+
+    // The notification's tap.
+    window_->Buttons()[kViewSettings]->trigger();
+    window_->Command(kCmdNotificationTapped);
+    EXPECT_TRUE(PadHasFocus());
+}
+
+TEST_F(DialPadViewTest, AfterThePowerUpQuestionTheKeyboardReachesThePad) {
+    Start("SW4.00", 200, false);
+    host_.companion = true;
+    host_.power = 0;
+    int asked = 0;
+    dialogs_.SetResponder([&](const DialogRequest&) { return ++asked, 1; });
+    ShowWindow();
+    window_->Watch().Tick();
+    EXPECT_EQ(asked, 1);
+    ASSERT_EQ(window_->App().cardState, 2);
+    EXPECT_TRUE(PadHasFocus());
+    KeyType("3");
+    EXPECT_EQ(Text(kNumberDisplayId), u"3");
+}
+
+TEST_F(DialPadViewTest, OnlyALoneFirstZeroTurnsIntoPlus) {
+    Start();
+    ShowWindow();
+    // At a normal pace on the keyboard, a number with "00" inside.
+    KeyType("07700900555", milliseconds(300));
+    EXPECT_EQ(Text(kNumberDisplayId), u"07700900555");
+    Press(Qt::Key_Escape);
+    KeyType("01100200", milliseconds(300));
+    EXPECT_EQ(Text(kNumberDisplayId), u"01100200");
+    Press(Qt::Key_Escape);
+    // The international prefix, by the keys and by the keyboard.
+    Click(kKeyZeroId);
+    now_ += milliseconds(400);
+    Click(kKeyZeroId);
+    KeyType("44", milliseconds(300));
+    EXPECT_EQ(Text(kNumberDisplayId), u"+44");
+    Press(Qt::Key_Escape);
+    KeyType("00", milliseconds(999));
+    EXPECT_EQ(Text(kNumberDisplayId), u"+");
+}
+
+TEST_F(DialPadViewTest, NineteenCharactersShowWholeAndTheTwentiethIsSignalled) {
+    Start();
+    ShowWindow();
+    KeyType("4477009001234567890");  // 19 digits
+    EXPECT_EQ(Text(kNumberDisplayId), u"4477009001234567890");
+    EXPECT_TRUE(Fits(kNumberDisplayId));
+    EXPECT_EQ(pad_->FullNumberSignals(), 0);
+    Snap("dialpad-19-digits");
+    // The 20th, by the keyboard and by the key: kept out, and the display says so.
+    KeyType("1");
+    EXPECT_EQ(Text(kNumberDisplayId), u"4477009001234567890");
+    EXPECT_EQ(pad_->FullNumberSignals(), 1);
+    EXPECT_TRUE(pad_->DisplayFlashing());
+    Snap("dialpad-number-full");
+    Click(kKeyHashId);
+    EXPECT_EQ(pad_->FullNumberSignals(), 2);
+    EXPECT_TRUE(WaitFor([&] { return !pad_->DisplayFlashing(); }, 5000));
+    // Room again after a Clear: no signal for the 19th.
+    Click(kKeyClearId);
+    KeyType("9");
+    EXPECT_EQ(pad_->FullNumberSignals(), 2);
+    // A number of "+" and digits, the widest the pad types.
+    Press(Qt::Key_Escape);
+    KeyType("00", milliseconds(10));
+    KeyType("888888888888888888");
+    EXPECT_EQ(Text(kNumberDisplayId).size(), 19u);
+    EXPECT_TRUE(Fits(kNumberDisplayId));
+    Snap("dialpad-19-wide");
+}
+
+TEST_F(DialPadViewTest, EveryStatusTextFitsItsLineWhole) {
+    Start();
+    ShowWindow();
+    struct Shown {
+        const char16_t* first;
+        const char16_t* second;
+        const char* picture;
+    };
+    const Shown texts[] = {
+        {u"Searching network...", u"", "status-searching"},
+        {u"Dialing...", u"", "status-dialing"},
+        {u"Voice call", u"", "status-voice-call"},
+        {u"Call ended", u"", "status-call-ended"},
+        {u"Call could not be established", u"", "status-not-established"},
+        {u"Number is busy", u"", "status-busy"},
+        {u"Number not answer", u"", "status-not-answer"},
+        {u"Unanswered", u"", "status-unanswered"},
+        {u"Incoming call", u"Alice Example", "status-incoming"},
+        {u"Card Phone is powered", u"down.", "status-powered-down"},
+        {u"No Card Phone inserted.", u"", "status-no-card"},
+        {u"Initializing...", u"", "status-initializing"},
+    };
+    for (const Shown& shown : texts) {
+        window_->ShowStatus(shown.first, shown.second);
+        pad_->SetControlText(kStatusLine3Id, u"+447700900123456");
+        EXPECT_EQ(Text(kStatusLine1Id), shown.first);
+        EXPECT_TRUE(Fits(kStatusLine1Id)) << Utf16ToUtf8(shown.first);
+        EXPECT_TRUE(Fits(kStatusLine2Id)) << Utf16ToUtf8(shown.second);
+        EXPECT_TRUE(Fits(kStatusLine3Id));
+        Snap(shown.picture);
+    }
+    // The lines end left of the antenna beside the gauge.
+    for (int id : {kStatusLine1Id, kStatusLine2Id, kStatusLine3Id})
+        EXPECT_LT(Line(id)->geometry().right(), 186);
+}
+
+TEST_F(DialPadViewTest, ClearAndBackspaceEditTheNumberShownAfterACall) {
+    Start();
+    ShowWindow();
+    KeyType("0123456");
+    Press(Qt::Key_Return);
+    ASSERT_TRUE(WaitFor([&] { return State() == kCallVoice; }));
+    Press(Qt::Key_Escape);
+    EXPECT_EQ(Text(kStatusLine1Id), u"Call ended");
+    ASSERT_TRUE(CardIdle());
+    LetTheResultGo();
+    EXPECT_EQ(Text(kNumberDisplayId), u"0123456");
+    Click(kKeyClearId);
+    EXPECT_EQ(Text(kNumberDisplayId), u"012345");
+    // The edited number goes on being typed; 20 Backspaces empty it and no more.
+    KeyType("9");
+    EXPECT_EQ(Text(kNumberDisplayId), u"0123459");
+    for (int i = 0; i < 20; ++i)
+        Press(Qt::Key_Backspace);
+    EXPECT_EQ(Text(kNumberDisplayId), u"");
+
+    // A redial from the Dialed log shows a number the buffer never held.
+    Press(Qt::Key_Escape);
+    for (int i = 0; i < 6; ++i)
+        Click(kKeyClearId);
+    Click(kKeyCallId);
+    EXPECT_EQ(Text(kNumberDisplayId), u"0123456");
+    ASSERT_TRUE(WaitFor([&] { return State() == kCallVoice; }));
+    Click(kKeyEndId);
+    ASSERT_TRUE(CardIdle());
+    LetTheResultGo();
+    Click(kKeyClearId);
+    EXPECT_EQ(Text(kNumberDisplayId), u"012345");
+    // Yet after a dial the next digit starts a new number.
+    Press(Qt::Key_Escape);
+    KeyType("0123456");
+    Press(Qt::Key_Return);
+    ASSERT_TRUE(WaitFor([&] { return State() == kCallVoice; }));
+    Press(Qt::Key_Escape);
+    ASSERT_TRUE(CardIdle());
+    LetTheResultGo();
+    KeyType("8");
+    EXPECT_EQ(Text(kNumberDisplayId), u"8");
+}
+
+TEST_F(DialPadViewTest, TheCallKeyIsGreyOnceTheCardManagerVanishesMidDial) {
+    Start("SW4.00", 600000);
+    ShowWindow();
+    KeyType("0123456");
+    Press(Qt::Key_Return);
+    ASSERT_TRUE(
+        WaitFor([&] { return sim_->Control("status").find("call=dialing") != std::string::npos; }));
+    // The card manager is gone: the next look of the watch drops the card.
+    window_->Watch().Tick();
+    EXPECT_EQ(window_->App().cardState, 1);
+    // The dial's failure may come before or after the pad hears the card is gone.
+    ASSERT_TRUE(WaitFor([&] { return State() != kCallDialing; }));
+    const int state = State();
+    for (int id = kKeyZeroId; id <= kKeyContactsId; ++id)
+        EXPECT_FALSE(FindControl(pad_, id)->isEnabled()) << id;
+    // Neither the key nor the keyboard dials.
+    Click(kKeyCallId);
+    Press(Qt::Key_Return);
+    EXPECT_EQ(Logged(kCallLogDialed), std::vector<std::string>{"0123456"});
+    EXPECT_EQ(State(), state);
+}
+
+TEST_F(DialPadViewTest, TheUiLogHasOneLineForEachStatusLineShown) {
+    const std::string path = temp_ / "ui.log";
+    UiLog uiLog(path);
+    context_.uiLog = &uiLog;
+    Start();
+    window_->ShowStatus(u"Card Phone is powered", u"down.");
+    window_->ShowStatus(u"No Card Phone inserted.", u"");
+    std::ifstream file(path);
+    std::vector<std::string> statuses;
+    for (std::string line; std::getline(file, line);) {
+        EXPECT_EQ(line.find('|'), std::string::npos) << line;
+        if (const size_t at = line.find(" status "); at != std::string::npos)
+            statuses.push_back(line.substr(at + 8));
+    }
+    context_.uiLog = nullptr;
+    const std::vector<std::string> tail(statuses.end() - std::min<size_t>(3, statuses.size()),
+                                        statuses.end());
+    EXPECT_EQ(tail, (std::vector<std::string>{"Card Phone is powered", "down.",
+                                              "No Card Phone inserted."}));
 }
 
 }  // namespace
