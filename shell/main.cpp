@@ -16,6 +16,7 @@
 #include "shell/dialogs.h"
 #include "shell/main_window.h"
 #include "shell/messages.h"
+#include "shell/stall_meter.h"
 #include "shell/ui_log.h"
 #include "shell/view_factories.h"
 #include "support/local_socket.h"
@@ -24,7 +25,7 @@
 namespace {
 
 constexpr char kUsage[] =
-    "Usage: vqm-dialer [--ui-log FILE] [--answer-boxes ok|cancel]\n"
+    "Usage: vqm-dialer [--ui-log FILE] [--answer-boxes ok|cancel] [--stall-log FILE]\n"
     "       vqm-dialer --help | --version | --list-ports\n"
     "The VQM Dialer: a phone on a GSM card modem.\n"
     "\n"
@@ -35,6 +36,9 @@ constexpr char kUsage[] =
     "                 box and dialog the dialer shows\n"
     "  --answer-boxes ok|cancel\n"
     "                 for scripted runs: answer every message box and dialog at once\n"
+    "  --stall-log FILE\n"
+    "                 for the figures: append a line to FILE each time the window's thread\n"
+    "                 is kept from its events for 2 ms or more (a 5 ms timer comes late)\n"
     "\n"
     "The card manager (vqm-cardsim for the simulated card, vqm-commander for a real modem)\n"
     "must be running; the dialer asks it to power the card up. F9 switches the display off\n"
@@ -55,7 +59,7 @@ int ListPorts() {
 }  // namespace
 
 int main(int argc, char** argv) {
-    std::string uiLogPath;
+    std::string uiLogPath, stallLogPath;
     int autoAnswer = 0;
     for (int i = 1; i < argc; ++i) {
         const bool hasValue = i + 1 < argc;
@@ -69,6 +73,8 @@ int main(int argc, char** argv) {
             return ListPorts();
         } else if (!std::strcmp(argv[i], "--ui-log") && hasValue) {
             uiLogPath = argv[++i];
+        } else if (!std::strcmp(argv[i], "--stall-log") && hasValue) {
+            stallLogPath = argv[++i];
         } else if (!std::strcmp(argv[i], "--answer-boxes") && hasValue &&
                    (autoAnswer = ParseAnswer(argv[i + 1]))) {
             ++i;
@@ -96,6 +102,7 @@ int main(int argc, char** argv) {
     vqm::SettingsStore settings;
     vqm::Link link(settings, vqm::DefaultDriverRoots());
     vqm::UiLog uiLog(uiLogPath);
+    vqm::StallMeter stallMeter(stallLogPath);
     vqm::Dialogs dialogs;
     dialogs.SetLog(&uiLog);
     dialogs.SetAutoAnswer(autoAnswer);
