@@ -660,5 +660,21 @@ TEST_F(DialPadViewTest, TheUiLogHasOneLineForEachStatusLineShown) {
                                               "No Card Phone inserted."}));
 }
 
+TEST_F(DialPadViewTest, ACallTheCardAlreadyHasShowsAsAVoiceCallThatEndEnds) {
+    Start("SW4.00", 200, false);
+    ShowWindow();
+    // The call comes up on the card before the dialer has the link.
+    ASSERT_EQ(sim_->Control("ring 0555123"), "OK");
+    ASSERT_EQ(sim_->Control("local-answer"), "OK");
+    ASSERT_NE(sim_->Control("status").find("call=active"), std::string::npos);
+    ASSERT_EQ(host_.OpenLink(), 1);
+    window_->Watch().SetCardState(2);
+    ASSERT_TRUE(WaitFor([&] { return State() == kCallVoice; }));
+    EXPECT_EQ(Text(kStatusLine1Id), u"Voice call");
+    Press(Qt::Key_Escape);
+    EXPECT_EQ(Text(kStatusLine1Id), u"Call ended");
+    EXPECT_TRUE(CardIdle());
+}
+
 }  // namespace
 }  // namespace vqm
