@@ -2,10 +2,12 @@
 
 #include <cstdio>
 
+#include "calls/call_log.h"
 #include "calls/dial_pad.h"
 #include "calls/tones.h"
 #include "calls/unsolicited.h"
 #include "contacts/phonebook_cache.h"
+#include "link/device_at.h"
 #include "link/link.h"
 #include "messaging/message_store.h"
 #include "support/local_socket.h"
@@ -82,27 +84,8 @@ void ClearNotice(DialPad& pad) {
 
 int CallerIdNumber(const EventRecord& record, float firmwareVersion, char* number,
                    size_t numberSize) {
-    if (!number || numberSize == 0) return 0;
-    number[0] = '\0';
-    const int length = record.length;  // at most 255: the text field holds 256 bytes
-    if (length < 7) return 0;
-    const char* p = record.text + 6;
-    const char* end = record.text + length;
-    if (firmwareVersion <= 3.81f) {
-        while (p < end && (*p == ' ' || *p == '\t' || *p == '\r' || *p == '\n'))
-            ++p;
-        size_t n = 0;
-        while (p < end && ((*p >= '0' && *p <= '9') || *p == '+') && n + 1 < numberSize)
-            number[n++] = *p++;
-        number[n] = '\0';
-        return static_cast<int>(n);
-    }
-    int copied = 0;
-    if (!ParseQuoted(p, end, number, numberSize, &copied)) {
-        number[0] = '\0';
-        return 0;
-    }
-    return copied;
+    // The record's text field holds 256 bytes; its length is at most 255.
+    return ParseCallerIdLine(record.text, record.length, firmwareVersion, number, numberSize);
 }
 
 int OnIncomingCall(DialPad& pad, const EventRecord&) {
@@ -131,6 +114,16 @@ int OnCallerId(DialPad& pad, const EventRecord& record) {
         NarrowToWide(number, wide, length, 64);
         shown = wide;
         FindNameByNumber(pad.Caches(), number, name, 64);
+    }
+    // Another number while the pad still rings for the one before: that caller gave up before
+    // the call list could tell, and a new call rings. The one before is logged, not lost.
+    const std::u16string before = pad.RingingCaller();
+    if (length > 0) pad.RingingCaller() = shown;
+    if (length > 0 && !before.empty() && before != shown) {
+        char previous[kCallLogNumberSize];
+        WideToNarrow(before.data(), previous, static_cast<int>(before.size()), sizeof previous);
+        AddUnansweredCall(pad.Log(), previous);
+        NotifyUnansweredCall(pad);
     }
     pad.SetStatusLine(2, name);
     pad.SetStatusLine(3, shown);

@@ -42,8 +42,9 @@ int OnNewMessage(DialPad& pad, const EventRecord& record);
 int NewMessageLocation(const EventRecord& record, char* memory = nullptr, size_t memorySize = 0);
 
 // The caller's number of a "+CLIP:" record: unquoted up to firmware 3.81 (blanks skipped, then
-// digits and "+"), the quoted field after. Writes at most numberSize - 1 bytes and a NUL;
-// returns the length, 0 when there is none.
+// digits and "+"), the quoted field after; a quoted first field is read quoted whatever the
+// firmware, and a type of 145 gives the '+' the number lacks. Writes at most numberSize - 1
+// bytes and a NUL; returns the length, 0 when there is none.
 int CallerIdNumber(const EventRecord& record, float firmwareVersion, char* number,
                    size_t numberSize);
 

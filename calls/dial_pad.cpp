@@ -197,6 +197,7 @@ void DialPad::LeaveIdle() {
 }
 
 void DialPad::EnterRinging() {
+    if (callState_ != kCallRinging) ringingCaller_.clear();
     LeaveIdle();
     callState_ = kCallRinging;
 }
@@ -326,7 +327,11 @@ void DialPad::OnAnswerResult(int result) {
 }
 
 void DialPad::HangUpLater() {
-    worker_.Post([this] { HangUp(link_); });
+    ++hangUpsPending_;
+    worker_.Post([this] {
+        HangUp(link_);
+        --hangUpsPending_;
+    });
 }
 
 void DialPad::OnEndKey() {
@@ -380,7 +385,7 @@ void DialPad::OnDialResult(int result) {
 
 void DialPad::OnCallActive() {
     if (callState_ == kCallRinging) return CallAnswered();  // on the card's own controls
-    if (callState_ == kCallIdle && connected_) {
+    if (callState_ == kCallIdle && connected_ && hangUpsPending_.load() == 0) {
         // A call the card already had (a restarted dialer, a card put back): shown, so that
         // End can end it.
         LeaveIdle();

@@ -140,7 +140,10 @@ class DialPad {
 
     // Used by the alert handlers.
     int CallState() const { return callState_; }
+    // Becomes the ringing state; a ring that starts a new call forgets the last caller.
     void EnterRinging();
+    // The number the ringing call's caller id showed, empty until one came.
+    std::u16string& RingingCaller() { return ringingCaller_; }
     void RefreshNumberDisplay();
 
     Link& LinkRef() { return link_; }
@@ -205,12 +208,16 @@ class DialPad {
     std::atomic<bool> dialThreadDone_{true};
 
     Notices notices_;
+    std::u16string ringingCaller_;
 
     // Every exchange the pad starts runs here, never on the window's thread.
     CardWorker worker_;
     bool connected_ = false;
-    bool polling_ = false;        // a timed poll is under way
-    bool answering_ = false;      // an ATA is under way
+    bool polling_ = false;    // a timed poll is under way
+    bool answering_ = false;  // an ATA is under way
+    // Hang-ups handed to the worker and not yet done: meanwhile the card may still list the
+    // call, which is not a call to show again.
+    std::atomic<int> hangUpsPending_{0};
     bool initialVolume_ = false;  // the volume set at connection, whose refusal greys the slider
     std::mutex polledMutex_;
     std::u16string polledOperator_;

@@ -77,6 +77,15 @@ void IdentityToWide(const char* reply, int length, char16_t* text, size_t textSi
         text[0] = u'\0';
 }
 
+// A periodic poll: it gives up at once when the port stays busy, and waits for the reply at
+// most as long as any query.
+unsigned PollCommand(Link& link, const char* command, char* reply, size_t replySize) {
+    ExchangeOptions options;
+    options.tryLock = true;
+    options.answerLimitMs = kQueryAnswerLimitMs;
+    return AtExchange(link, command, reply, replySize, options);
+}
+
 }  // namespace
 
 int ParseIdentityReply(const char* reply, int length, char* line, size_t lineSize) {
@@ -237,11 +246,10 @@ int ParseCallerIdLine(const char* text, int length, float firmwareVersion, char*
     return static_cast<int>(out);
 }
 
-namespace device {
-
 float GetFirmwareVersion(Link& link, char16_t* text, size_t textSize) {
     char reply[kReplySize];
-    const int length = static_cast<int>(AtCommand(link, "AT+GMR\r", reply, sizeof reply));
+    const int length = static_cast<int>(
+        AtCommandWithin(link, "AT+GMR\r", reply, sizeof reply, kQueryAnswerLimitMs));
     if (length == 0) return 0.0f;
     IdentityToWide(reply, length, text, textSize);
     return ParseFirmwareReply(reply, length);
@@ -250,25 +258,28 @@ float GetFirmwareVersion(Link& link, char16_t* text, size_t textSize) {
 int GetCardIdentity(Link& link, char16_t* manufacturer, size_t manufacturerSize, char16_t* model,
                     size_t modelSize, char16_t* firmware, size_t firmwareSize) {
     char reply[kReplySize];
-    int length = static_cast<int>(AtCommand(link, "AT+GMI\r", reply, sizeof reply));
+    int length = static_cast<int>(
+        AtCommandWithin(link, "AT+GMI\r", reply, sizeof reply, kQueryAnswerLimitMs));
     if (length == 0) return 0;
     IdentityToWide(reply, length, manufacturer, manufacturerSize);
-    length = static_cast<int>(AtCommand(link, "AT+GMM\r", reply, sizeof reply));
+    length = static_cast<int>(
+        AtCommandWithin(link, "AT+GMM\r", reply, sizeof reply, kQueryAnswerLimitMs));
     if (length == 0) return 0;
     IdentityToWide(reply, length, model, modelSize);
-    device::GetFirmwareVersion(link, firmware, firmwareSize);
+    GetFirmwareVersion(link, firmware, firmwareSize);
     return 1;
 }
 
 int GetSignalBars(Link& link) {
     char reply[kReplySize];
-    const int length = static_cast<int>(AtCommandTry(link, "AT+CSQ\r", reply, sizeof reply));
+    const int length = static_cast<int>(PollCommand(link, "AT+CSQ\r", reply, sizeof reply));
     return length == 0 ? -1 : ParseSignalReply(reply, length);
 }
 
 int GetOperatorName(Link& link, char16_t* name, size_t nameSize) {
     char reply[kReplySize];
-    const int length = static_cast<int>(AtCommand(link, "AT+COPS?\r", reply, sizeof reply));
+    const int length = static_cast<int>(
+        AtCommandWithin(link, "AT+COPS?\r", reply, sizeof reply, kQueryAnswerLimitMs));
     if (length == 0) return 0;
     char narrow[64];
     const int n = ParseOperatorReply(reply, length, narrow, sizeof narrow);
@@ -279,23 +290,23 @@ int GetOperatorName(Link& link, char16_t* name, size_t nameSize) {
 
 int GetSpeakerVolume(Link& link) {
     char reply[kReplySize];
-    const int length = static_cast<int>(AtCommandTry(link, "AT+CLVL?\r", reply, sizeof reply));
+    const int length = static_cast<int>(PollCommand(link, "AT+CLVL?\r", reply, sizeof reply));
     return length == 0 ? -1 : ParseVolumeReply(reply, length);
 }
 
 int SetSpeakerVolume(Link& link, int level) {
     char command[32], reply[kReplySize];
     std::snprintf(command, sizeof command, "AT+CLVL=%d\r", level);
-    const int length = static_cast<int>(AtCommand(link, command, reply, sizeof reply));
+    const int length =
+        static_cast<int>(AtCommandWithin(link, command, reply, sizeof reply, kQueryAnswerLimitMs));
     return length == 0 ? -1 : AtFinalResult(reply, length);
 }
 
 int QueryCallState(Link& link, int* state, int* mode) {
     char reply[kReplySize];
-    const int length = static_cast<int>(AtCommand(link, "AT+CLCC\r", reply, sizeof reply));
+    const int length = static_cast<int>(
+        AtCommandWithin(link, "AT+CLCC\r", reply, sizeof reply, kQueryAnswerLimitMs));
     return length == 0 ? kCallListUnknown : ParseCallListReply(reply, length, state, mode);
 }
-
-}  // namespace device
 
 }  // namespace vqm

@@ -67,9 +67,8 @@ int ParseCallListReply(const char* reply, int length, int* state, int* mode);
 int ParseCallerIdLine(const char* text, int length, float firmwareVersion, char* number,
                       size_t numberSize);
 
-// The wrappers. They live in their own namespace while the link's older copies of the same
-// queries still exist; their contracts are those of the queries in link/link.h unless said.
-namespace device {
+// The wrappers. The queries a poll makes (signal, volume, call list) and the start-up ones wait
+// for a reply at most kQueryAnswerLimitMs, so a silent card never holds a caller for ever.
 
 // "AT+GMR": the version (0.0 when unknown or no reply) and the reply's first line in text.
 float GetFirmwareVersion(Link& link, char16_t* text, size_t textSize);
@@ -85,9 +84,7 @@ int GetSpeakerVolume(Link& link);
 // "AT+CLVL=<level>": the final result of the reply, -1 when none came.
 int SetSpeakerVolume(Link& link, int level);
 // "AT+CLCC": kCallListCall with *state and *mode, kCallListEmpty, or kCallListUnknown (also when
-// no reply came). Unlike the older copy, "no reply" and "damaged" are not reported as "no call".
+// no reply came): "no reply" and "damaged" are never reported as "no call".
 int QueryCallState(Link& link, int* state, int* mode);
-
-}  // namespace device
 
 }  // namespace vqm

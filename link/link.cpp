@@ -17,7 +17,7 @@
 
 #include <sys/eventfd.h>
 
-#include "link/operators.h"
+#include "link/device_at.h"
 #include "link/reply_framer.h"
 #include "support/lock_within.h"
 #include "support/text.h"
@@ -186,12 +186,12 @@ unsigned AtExchange(Link& link, const char* command, char* reply, size_t replySi
         // seconds. Closing the port or a cancel is what ends a wait for a card that never
         // answers.
         int waited = 0;
-        bool cancelled = false;
+        bool cancelled = false, timedOut = false;
         while (!failed && !framer.HeardAnything()) {
             Sleep(link, kAnswerPollMs);
             waited += kAnswerPollMs;
-            if (link.portState.load() == 0 || TakeCancel(options) ||
-                (options.answerLimitMs > 0 && waited >= options.answerLimitMs)) {
+            if (options.answerLimitMs > 0 && waited >= options.answerLimitMs) timedOut = true;
+            if (link.portState.load() == 0 || TakeCancel(options) || timedOut) {
                 cancelled = true;
                 break;
             }
@@ -216,6 +216,9 @@ unsigned AtExchange(Link& link, const char* command, char* reply, size_t replySi
                 }
             }
         }
+        // Only an exchange that had to have an answer within its limit counts as unanswered;
+        // a cancel or a closing port says nothing of the card.
+        if (timedOut && !framer.HeardAnything()) ++link.unansweredInRow;
         if (cancelled) failed = true;
         // The rest, until the card falls silent after its final result. Unsolicited lines
         // that came first are not the reply: their silence goes on counting as the wait.
@@ -230,6 +233,9 @@ unsigned AtExchange(Link& link, const char* command, char* reply, size_t replySi
             if (r == ReadResult::Byte) {
                 framer.Feed(byte);
                 silentMs = 0;
+                // Nothing after the final result is the reply's: a ring that follows it is
+                // handed on now rather than after the card falls silent.
+                if (framer.Complete() && framer.UnsolicitedAfterResult()) break;
                 continue;
             }
             if (framer.Complete()) break;
@@ -243,6 +249,7 @@ unsigned AtExchange(Link& link, const char* command, char* reply, size_t replySi
             if (!begun && options.answerLimitMs > 0 && waited + silentMs >= options.answerLimitMs)
                 break;
         }
+        if (framer.HeardAnything()) link.unansweredInRow.store(0);
         if (!failed) {
             if (framer.EchoSeen())
                 link.echo.store(EchoMode::Echoes);
@@ -262,18 +269,6 @@ unsigned AtExchange(Link& link, const char* command, char* reply, size_t replySi
 }
 
 namespace {
-
-// Fills text with the reply's first line of information, converted to UTF-16.
-void FirstLineToWide(char* reply, int length, char16_t* text, size_t textSize) {
-    TrimReply(reply, &length);
-    int lineLength = 0;
-    while (lineLength < length && reply[lineLength] != '\r' && reply[lineLength] != '\n')
-        ++lineLength;
-    if (lineLength > 0)
-        NarrowToWide(reply, text, lineLength, textSize);
-    else if (text && textSize > 0)
-        text[0] = u'\0';
-}
 
 // Takes in what the card sent by itself while no exchange ran: its unsolicited lines are
 // queued, a line cut by the end of the read waits for the rest.
@@ -333,7 +328,7 @@ void ListenerWait(Link& link, std::chrono::steady_clock::time_point until) {
 void ListenerThread(Link* link) {
     using std::chrono::steady_clock;
     bool callSeen = false;
-    int silentPolls = 0;
+    bool silenceReported = false;
     auto nextPoll = steady_clock::now();
     while (link->portState.load() > 0) {
         if (link->portState.load() != 2) {
@@ -348,13 +343,12 @@ void ListenerThread(Link* link) {
             nextPoll = steady_clock::now() + std::chrono::milliseconds(link->listenerPassMs);
             int state = -1, mode = -1;
             const int calls = QueryCallState(*link, &state, &mode);
-            if (calls < 0 && link->portState.load() > 0) {
-                // No answer at all: after a few passes the card is taken for gone.
-                if (++silentPolls == kSilentPollsGone && link->postToMain)
-                    link->postToMain(kMsgCardSilent);
-            } else if (calls >= 0) {
-                silentPolls = 0;
-            }
+            // Exchanges that any card answers at once have gone unanswered several times in a
+            // row, over several seconds: the card is taken for gone, once.
+            const bool silent = link->unansweredInRow.load() >= kUnansweredGone;
+            if (silent && !silenceReported && link->portState.load() > 0 && link->postToMain)
+                link->postToMain(kMsgCardSilent);
+            silenceReported = silent;
             if (calls == 1) {
                 if (state == 0 && mode == 0) {
                     if (link->postToMain) link->postToMain(kMsgCallActive);
@@ -429,6 +423,7 @@ int PortOpenDevice(Link& link, const char* device) {
         std::lock_guard<std::mutex> lock(link.portMutex);
         link.fd = fd;
         link.echo.store(EchoMode::Unknown);
+        link.unansweredInRow.store(0);
         link.partialLine.clear();
         ++link.openCount;
         link.servingTicket = link.nextTicket;  // nobody from an earlier opening is waiting
@@ -560,123 +555,6 @@ int ModemInit(Link& link) {
         // Any card answers these at once; the window waits meanwhile, so the wait is short.
         if (AtCommandWithin(link, command, reply, sizeof reply, kInitAnswerLimitMs) == 0) return 0;
     }
-    return 1;
-}
-
-float GetFirmwareVersion(Link& link, char16_t* text, size_t textSize) {
-    char reply[256];
-    int length = static_cast<int>(
-        AtCommandWithin(link, "AT+GMR\r", reply, sizeof reply, kQueryAnswerLimitMs));
-    if (length == 0) return 0.0f;
-    float version = 0.0f;
-    int at = FindPattern(0, "SW", 2, reply, length);
-    if (at >= 0 && std::sscanf(reply + at, "SW%f", &version) != 1) version = 0.0f;
-    if (text) FirstLineToWide(reply, length, text, textSize);
-    return version;
-}
-
-int GetCardIdentity(Link& link, char16_t* manufacturer, size_t manufacturerSize, char16_t* model,
-                    size_t modelSize, char16_t* firmware, size_t firmwareSize) {
-    char reply[256];
-    int length = static_cast<int>(
-        AtCommandWithin(link, "AT+GMI\r", reply, sizeof reply, kQueryAnswerLimitMs));
-    if (length == 0) return 0;
-    FirstLineToWide(reply, length, manufacturer, manufacturerSize);
-    length = static_cast<int>(
-        AtCommandWithin(link, "AT+GMM\r", reply, sizeof reply, kQueryAnswerLimitMs));
-    if (length == 0) return 0;
-    FirstLineToWide(reply, length, model, modelSize);
-    GetFirmwareVersion(link, firmware, firmwareSize);
-    return 1;
-}
-
-int GetSignalBars(Link& link) {
-    char reply[256];
-    ExchangeOptions options;
-    options.tryLock = true;
-    options.answerLimitMs = kQueryAnswerLimitMs;
-    int length = static_cast<int>(AtExchange(link, "AT+CSQ\r", reply, sizeof reply, options));
-    if (length == 0) return -1;
-    int quality = 0, errorRate = 0;
-    int at = FindPattern(0, "+CSQ: ", 6, reply, length);
-    if (at >= 0 && std::sscanf(reply + at + 6, "%d,%d", &quality, &errorRate) < 1) quality = 0;
-    // 99 means "not known"; it shows as full strength, as the card's own display did.
-    if (quality < 8) return 0;
-    if (quality < 16) return 1;
-    if (quality < 24) return 2;
-    if (quality < 31) return 3;
-    return 4;
-}
-
-int GetOperatorName(Link& link, char16_t* name, size_t nameSize) {
-    char reply[256];
-    int length = static_cast<int>(
-        AtCommandWithin(link, "AT+COPS?\r", reply, sizeof reply, kQueryAnswerLimitMs));
-    if (length == 0) return 0;
-    int at = FindPattern(0, ",2,", 3, reply, length);
-    uint32_t code = at >= 1 ? static_cast<uint32_t>(std::atoi(reply + at + 3)) : 0;
-    char narrow[32];
-    int nameLength = OperatorNameByCode(code, narrow, sizeof narrow);
-    if (nameLength <= 0) return 0;
-    NarrowToWide(narrow, name, nameLength, nameSize);
-    return 1;
-}
-
-int GetSpeakerVolume(Link& link) {
-    char reply[256];
-    ExchangeOptions options;
-    options.tryLock = true;
-    options.answerLimitMs = kQueryAnswerLimitMs;
-    int length = static_cast<int>(AtExchange(link, "AT+CLVL?\r", reply, sizeof reply, options));
-    if (length == 0) return -1;
-    int at = FindPattern(0, "+CLVL:", 6, reply, length);
-    if (at < 0) return -1;
-    const char* p = reply + at + 6;
-    while (*p == ' ')
-        ++p;
-    int32_t level = -1;
-    return ParseInt(p, reply + length, &level) ? level : -1;
-}
-
-int SetSpeakerVolume(Link& link, int level) {
-    char command[32], reply[256];
-    std::snprintf(command, sizeof command, "AT+CLVL=%d\r", level);
-    int length =
-        static_cast<int>(AtCommandWithin(link, command, reply, sizeof reply, kQueryAnswerLimitMs));
-    return length == 0 ? -1 : AtFinalResult(reply, length);
-}
-
-int QueryCallState(Link& link, int* state, int* mode) {
-    char reply[256];
-    int length = static_cast<int>(
-        AtCommandWithin(link, "AT+CLCC\r", reply, sizeof reply, kQueryAnswerLimitMs));
-    if (length == 0) return -1;
-    int at = FindPattern(0, "+CLCC:", 6, reply, length);
-    if (at < 0) {
-        // Only a clean answer means no call: the final OK and nothing else but line ends.
-        int i = 0;
-        while (i < length && (reply[i] == '\r' || reply[i] == '\n'))
-            ++i;
-        if (i + 2 > length || reply[i] != 'O' || reply[i + 1] != 'K') return -1;
-        for (i += 2; i < length; ++i)
-            if (reply[i] != '\r' && reply[i] != '\n') return -1;
-        return 0;
-    }
-    const char* end = reply + length;
-    const char* p = reply + at + 6;
-    while (p < end && *p == ' ')
-        ++p;
-    int32_t fields[4];
-    for (int i = 0; i < 4; ++i) {
-        p = ParseInt(p, end, &fields[i]);
-        if (!p) return -1;
-        if (i < 3) {
-            if (*p != ',') return -1;
-            ++p;
-        }
-    }
-    if (state) *state = fields[2];
-    if (mode) *mode = fields[3];
     return 1;
 }
 

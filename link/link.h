@@ -21,10 +21,11 @@ class SettingsStore;
 
 inline constexpr int kMsgCallActive = 2126;
 inline constexpr int kMsgCallListEmpty = 2127;
-// The card has not answered the listener's call-list poll for kSilentPollsGone passes in a row:
-// the main window treats it as gone, as it does a pulled card.
+// The card has left kUnansweredGone exchanges in a row unanswered within their limits (about ten
+// seconds of silence with the listener's polls alone): the main window treats it as gone, as it
+// does a pulled card, and the card watch connects again once the card answers.
 inline constexpr int kMsgCardSilent = 2133;
-inline constexpr int kSilentPollsGone = 3;
+inline constexpr int kUnansweredGone = 3;
 
 // Whether the modem echoes what it is sent, as the link has learnt it.
 enum class EchoMode { Unknown, Echoes, Silent };
@@ -54,6 +55,8 @@ struct Link {
     std::atomic<int> portState{0};  // 0 closed, 1 open and free, 2 in use
     float firmwareVersion = 0.0f;
     std::atomic<EchoMode> echo{EchoMode::Unknown};
+    // Exchanges in a row that got no answer at all within their limit.
+    std::atomic<int> unansweredInRow{0};
     // The start of an unsolicited line that a read ended in the middle of (guarded by the port).
     std::string partialLine;
     // Written to wake the listener: an unsolicited record was queued, or the port closes.
@@ -121,17 +124,8 @@ void WakeListener(Link& link);
 int AtFinalResult(const char* reply, int length);
 
 int ModemInit(Link& link);
-float GetFirmwareVersion(Link& link, char16_t* text, size_t textSize);
-int GetCardIdentity(Link& link, char16_t* manufacturer, size_t manufacturerSize, char16_t* model,
-                    size_t modelSize, char16_t* firmware, size_t firmwareSize);
-int GetSignalBars(Link& link);
-int GetOperatorName(Link& link, char16_t* name, size_t nameSize);
-int GetSpeakerVolume(Link& link);
-int SetSpeakerVolume(Link& link, int level);
-
-// "AT+CLCC": 1 with the state and mode of the first listed call; 0 when the card says there
-// is no call (a clean final OK without a call line); -1 when there was no reply or it was
-// damaged, which says nothing about the call.
-int QueryCallState(Link& link, int* state, int* mode);
 
 }  // namespace vqm
+
+// The card queries (firmware, identity, signal, operator, volume, call list).
+#include "link/device_at.h"  // IWYU pragma: export

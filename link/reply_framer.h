@@ -41,6 +41,8 @@ class ReplyFramer {
     // Echo bytes still expected (none once the reply has begun).
     bool EchoPending() const { return !echoOff_ && echoPos_ < echo_.size(); }
 
+    // An unsolicited line came after the final result, and no line is half read.
+    bool UnsolicitedAfterResult() const { return lateUnsolicited_ && !inLine_; }
     // Unsolicited lines completed so far, each without its line end, in arrival order.
     std::vector<std::string> TakeUnsolicited();
     // A line still being received when the exchange ended, to be resumed by the next read.
@@ -70,6 +72,7 @@ class ReplyFramer {
     std::string line_;  // the current line's first bytes, for classifying it
     bool complete_ = false;
     bool heard_ = false;
+    bool lateUnsolicited_ = false;
     std::vector<std::string> unsolicited_;
 };
 

@@ -14,8 +14,16 @@ namespace {
 constexpr char kCtrlZ = 0x1A;
 constexpr size_t kReplySize = 256;
 
+// The message commands work on the SIM, which answers at once; some run on the window's
+// thread, so a card that does not answer holds it only this long. Sending (the text after its
+// prompt, and a stored message) is a network operation and waits longer.
+constexpr int kSimAnswerLimitMs = 3000;
+constexpr int kSendAnswerLimitMs = 60000;
+
 int Exchange(Link& link, const char* command, char* reply, size_t replySize) {
-    return static_cast<int>(AtCommand(link, command, reply, replySize));
+    const bool sending = std::strncmp(command, "AT+CMSS", 7) == 0;
+    return static_cast<int>(AtCommandWithin(link, command, reply, replySize,
+                                            sending ? kSendAnswerLimitMs : kSimAnswerLimitMs));
 }
 
 // Cards put a blank behind the colon of a reply tag; the fields start after it.
@@ -64,6 +72,7 @@ int PromptAndBody(Link& link, const char* command, char* body, size_t bodyLength
     if (!PortLock(link)) return 0;
     ExchangeOptions held;
     held.lockHeld = true;
+    held.answerLimitMs = kSendAnswerLimitMs;
     int length = static_cast<int>(AtExchange(link, command, reply, replySize, held));
     if (length > 0 && FindPattern(0, ">", 1, reply, length) >= 0)
         length = static_cast<int>(AtExchange(link, body, reply, replySize, held));

@@ -240,9 +240,13 @@ void MainWindow::OnCommand(int id) {
             break;
         case kCmdExit:
             if (card_.CompanionExists() && card_.SendCompanion(kMsgCardPowerQuery) == 1L) {
-                // A card that does not answer does not hold up the exit.
+                // Neither a card that does not answer nor a dial holding the port holds up the
+                // exit: closing the port ends the dial's wait.
                 char reply[256];
-                AtCommandWithin(context_.link, "ATH\r", reply, sizeof reply, kExitHangUpLimitMs);
+                ExchangeOptions options;
+                options.tryLock = true;
+                options.answerLimitMs = kExitHangUpLimitMs;
+                AtExchange(context_.link, "ATH\r", reply, sizeof reply, options);
             }
             Shutdown();
             break;
@@ -265,6 +269,9 @@ void MainWindow::OnCommand(int id) {
                 dialPad->OnMessage(kWmCommand, kCmdNotificationTapped, 0);
             break;
         default:
+            // A control's command from outside (a script driving the dialer through its
+            // socket) goes to the view in front, as the control's own click would.
+            if (View* view = ViewAt(views_.current)) view->OnMessage(kWmCommand, id, 0);
             break;
     }
 }

@@ -88,6 +88,7 @@ class DialPadViewTest : public ::testing::Test {
         cardsim::SimConfig config;
         config.baud = 0;
         config.engine.firmware = firmware;
+        config.engine.dialect = dialect_;
         config.engine.dialDelayMs = dialDelayMs;
         config.engine.ringTimeoutMs = 600000;
         sim_ = std::make_unique<cardsim::CardSim>(config);
@@ -226,10 +227,18 @@ class DialPadViewTest : public ::testing::Test {
     ShellContext context_{settings_, link_, dialogs_, temp_ / "run"};
     SimCardHost host_{link_};
     std::unique_ptr<cardsim::CardSim> sim_;
+    cardsim::Dialect dialect_ = cardsim::Dialect::Card;
     std::unique_ptr<MainWindow> window_;
     DialPadView* pad_ = nullptr;
     std::chrono::steady_clock::time_point now_ =
         std::chrono::steady_clock::time_point{} + std::chrono::hours(1);
+};
+
+// The calls themselves run on the card's own dialect and on a standard 27.007 modem.
+class DialPadCallTest : public DialPadViewTest,
+                        public ::testing::WithParamInterface<cardsim::Dialect> {
+  protected:
+    DialPadCallTest() { dialect_ = GetParam(); }
 };
 
 TEST_F(DialPadViewTest, KeysTypeTheNumberWithItsLimitsAndAnEmptyCallDoesNothing) {
@@ -259,7 +268,7 @@ TEST_F(DialPadViewTest, KeysTypeTheNumberWithItsLimitsAndAnEmptyCallDoesNothing)
     EXPECT_TRUE(Logged(kCallLogDialed).empty());
 }
 
-TEST_F(DialPadViewTest, AKnownCallerRingsIsAnsweredAndHangsUp) {
+TEST_P(DialPadCallTest, AKnownCallerRingsIsAnsweredAndHangsUp) {
     KnowContact(kKnownNumber, "Alice Example");
     Start();
     // The operator's name comes with the one-second timer.
@@ -296,7 +305,7 @@ TEST_F(DialPadViewTest, AKnownCallerRingsIsAnsweredAndHangsUp) {
     EXPECT_EQ(Text(kStatusLine3Id), u"");
 }
 
-TEST_F(DialPadViewTest, ABusyNumberIsReportedAndCallRedialsTheNewestDialledNumber) {
+TEST_P(DialPadCallTest, ABusyNumberIsReportedAndCallRedialsTheNewestDialledNumber) {
     Start();
     ASSERT_EQ(sim_->Control("busy 0123456"), "OK");
     Type("0123456");
@@ -327,7 +336,7 @@ TEST_F(DialPadViewTest, ABusyNumberIsReportedAndCallRedialsTheNewestDialledNumbe
     EXPECT_EQ(Text(kNumberDisplayId), u"7");
 }
 
-TEST_F(DialPadViewTest, EndWhileDiallingCancelsTheDial) {
+TEST_P(DialPadCallTest, EndWhileDiallingCancelsTheDial) {
     Start("SW4.00", 600000);
     Type("0123456");
     Click(kKeyCallId);
@@ -342,7 +351,7 @@ TEST_F(DialPadViewTest, EndWhileDiallingCancelsTheDial) {
         WaitFor([&] { return sim_->Control("status").find("call=none") != std::string::npos; }));
 }
 
-TEST_F(DialPadViewTest, ACallAnsweredOnTheCardMovesToVoiceCallAndIsLogged) {
+TEST_P(DialPadCallTest, ACallAnsweredOnTheCardMovesToVoiceCallAndIsLogged) {
     Start();
     ASSERT_EQ(sim_->Control("ring 0555123"), "OK");
     ASSERT_TRUE(WaitFor([&] { return Ringing() && Text(kNumberDisplayId) == u"0555123"; }));
@@ -355,7 +364,7 @@ TEST_F(DialPadViewTest, ACallAnsweredOnTheCardMovesToVoiceCallAndIsLogged) {
     EXPECT_TRUE(Logged(kCallLogUnanswered).empty());
 }
 
-TEST_F(DialPadViewTest, ARingLeftUnansweredIsLoggedAndCounted) {
+TEST_P(DialPadCallTest, ARingLeftUnansweredIsLoggedAndCounted) {
     // Old firmware sends the caller's number unquoted.
     Start("SW3.80");
     ASSERT_EQ(sim_->Control("ring +3069123"), "OK");
@@ -378,7 +387,7 @@ TEST_F(DialPadViewTest, ARingLeftUnansweredIsLoggedAndCounted) {
     EXPECT_EQ(Text(kNotificationLineId), u"");
 }
 
-TEST_F(DialPadViewTest, TheCardStateSetsTheVolumeAndGreysThePad) {
+TEST_P(DialPadCallTest, TheCardStateSetsTheVolumeAndGreysThePad) {
     Start();
     // No level stored: 4, written back, and the card set to it.
     int32_t level = -1;
@@ -660,7 +669,7 @@ TEST_F(DialPadViewTest, TheUiLogHasOneLineForEachStatusLineShown) {
                                               "No Card Phone inserted."}));
 }
 
-TEST_F(DialPadViewTest, ACallTheCardAlreadyHasShowsAsAVoiceCallThatEndEnds) {
+TEST_P(DialPadCallTest, ACallTheCardAlreadyHasShowsAsAVoiceCallThatEndEnds) {
     Start("SW4.00", 200, false);
     ShowWindow();
     // The call comes up on the card before the dialer has the link.
@@ -675,6 +684,12 @@ TEST_F(DialPadViewTest, ACallTheCardAlreadyHasShowsAsAVoiceCallThatEndEnds) {
     EXPECT_EQ(Text(kStatusLine1Id), u"Call ended");
     EXPECT_TRUE(CardIdle());
 }
+
+INSTANTIATE_TEST_SUITE_P(Dialects, DialPadCallTest,
+                         ::testing::Values(cardsim::Dialect::Card, cardsim::Dialect::Standard),
+                         [](const ::testing::TestParamInfo<cardsim::Dialect>& info) {
+                             return info.param == cardsim::Dialect::Card ? "card" : "standard";
+                         });
 
 }  // namespace
 }  // namespace vqm

@@ -8,6 +8,9 @@
 #include <filesystem>
 #include <fstream>
 #include <sstream>
+#include <string>
+#include <thread>
+#include <vector>
 
 #include "support/local_socket.h"
 #include "support/settings_store.h"
@@ -26,7 +29,8 @@ using testing::WaitFor;
 constexpr char kPowerUpQuestion[] =
     "box VQM Dialer: Tavro Card Phone 2.0 is not powered up, would you like to power it up now?";
 
-class DialerProgramTest : public ::testing::Test {
+// Every test runs on the card's own dialect and on a standard 27.007 modem.
+class DialerProgramTest : public ::testing::TestWithParam<const char*> {
   protected:
     DialerProgramTest() {
         fs::create_directories(run_);
@@ -43,8 +47,9 @@ class DialerProgramTest : public ::testing::Test {
                " QT_QPA_PLATFORM=offscreen DBUS_SESSION_BUS_ADDRESS=unix:path=/nonexistent ";
     }
     void StartCard(const std::string& options = "") {
-        card_.Start(Environment() + VQM_CARDSIM + " --power-up-ms 500 --state-dir " +
-                    (temp_ / "state") + " " + options + " >" + (temp_ / "cardsim.out") + " 2>&1");
+        card_.Start(Environment() + VQM_CARDSIM + " --dialect " + GetParam() +
+                    " --power-up-ms 500 --state-dir " + (temp_ / "state") + " " + options + " >" +
+                    (temp_ / "cardsim.out") + " 2>&1");
         ASSERT_TRUE(
             WaitFor([&] { return ServerAnswers(WindowSocketPath(run_, kCompanionClass)); }));
     }
@@ -75,6 +80,23 @@ class DialerProgramTest : public ::testing::Test {
     std::pair<std::string, int> Ctl(const std::string& command) {
         return RunShell(Environment() + VQM_CARDSIM + " ctl " + command);
     }
+    bool Standard() const { return std::string(GetParam()) == "standard"; }
+    // A key of the DialPad, as a click on it.
+    void Key(int id) { SendWindowMessage(DialerSocket(), 273, id, 0, 2000); }
+    void Type(const std::string& digits) {
+        for (char c : digits)
+            Key(1126 + (c - '0'));
+    }
+    // The numbers of a call log, oldest first: 64-byte records, the number first.
+    std::vector<std::string> Logged(int log) const {
+        std::ifstream file(temp_ / ("data/VQMFull/callog" + std::to_string(log) + ".db"),
+                           std::ios::binary);
+        std::vector<std::string> numbers;
+        char record[64];
+        while (file.read(record, sizeof record))
+            numbers.emplace_back(record, strnlen(record, 32));
+        return numbers;
+    }
 
     const testing::TempFolder temp_;
     const std::string run_ = temp_ / "xdg/VQMFull";
@@ -82,7 +104,7 @@ class DialerProgramTest : public ::testing::Test {
     Background dialer_;
 };
 
-TEST_F(DialerProgramTest, PowerUpAnsweredOkConnectsAndTheDialerEndsCleanly) {
+TEST_P(DialerProgramTest, PowerUpAnsweredOkConnectsAndTheDialerEndsCleanly) {
     StartCard();
     StartDialer("ok");
     ASSERT_TRUE(LogShows(std::string(kPowerUpQuestion) + " -> OK")) << Log();
@@ -90,9 +112,12 @@ TEST_F(DialerProgramTest, PowerUpAnsweredOkConnectsAndTheDialerEndsCleanly) {
     ASSERT_TRUE(LogShows("card 2 connected")) << Log();
     EXPECT_LT(Log().find("window shown"), Log().find("card 2 connected"));
 
-    // About reads the firmware from the card.
+    // About reads the firmware from the card (a modem that is not the card has no version).
     EXPECT_EQ(SendWindowMessage(DialerSocket(), 273, 40018, 0), 0L);
-    EXPECT_TRUE(LogShows("dialog About: Tavro Card Phone 2.0 Firmware Version 4.00")) << Log();
+    if (!Standard())
+        EXPECT_TRUE(LogShows("dialog About: Tavro Card Phone 2.0 Firmware Version 4.00")) << Log();
+    else
+        EXPECT_TRUE(LogShows("dialog About")) << Log();
 
     // A second start brings the first forward and goes away.
     auto [output, status] = RunShell(Environment() + VQM_DIALER);
@@ -107,7 +132,7 @@ TEST_F(DialerProgramTest, PowerUpAnsweredOkConnectsAndTheDialerEndsCleanly) {
     EXPECT_EQ(Ctl("status").first.find("call=none") != std::string::npos, true);
 }
 
-TEST_F(DialerProgramTest, PullingTheCardDropsTheConnectionAndAStopSignalEndsTheDialer) {
+TEST_P(DialerProgramTest, PullingTheCardDropsTheConnectionAndAStopSignalEndsTheDialer) {
     StartCard("--powered");
     StartDialer("ok");
     ASSERT_TRUE(LogShows("card 2 connected")) << Log();
@@ -122,7 +147,7 @@ TEST_F(DialerProgramTest, PullingTheCardDropsTheConnectionAndAStopSignalEndsTheD
     EXPECT_EQ(dialer_.WaitExit(10s), 0) << Read(temp_ / "dialer.out");
 }
 
-TEST_F(DialerProgramTest, DecliningThePowerUpAsksOnceAndSaysTheCardIsAbsentOnce) {
+TEST_P(DialerProgramTest, DecliningThePowerUpAsksOnceAndSaysTheCardIsAbsentOnce) {
     StartCard();
     StartDialer("cancel");
     ASSERT_TRUE(LogShows(std::string(kPowerUpQuestion) + " -> Cancel")) << Log();
@@ -133,6 +158,97 @@ TEST_F(DialerProgramTest, DecliningThePowerUpAsksOnceAndSaysTheCardIsAbsentOnce)
     EXPECT_EQ(Count("status "), 1u) << Log();
     EXPECT_EQ(Count("card 2"), 0u) << Log();
 }
+
+// Rings, caller ids, answers, rejects, hang-ups on both sides, a dial and a busy number, all
+// through the real program; the log of what the window showed tells what happened.
+TEST_P(DialerProgramTest, CallsComeAndGoAndAreLogged) {
+    StartCard("--powered");
+    StartDialer("ok");
+    ASSERT_TRUE(LogShows("card 2 connected")) << Log();
+    // The operator, in whatever form the modem reports it.
+    EXPECT_TRUE(LogShows("status COSMOTE")) << Log();
+
+    // A ring, the caller's number, answered here, ended by the far end.
+    EXPECT_EQ(Ctl("ring +447700900123").second, 0);
+    ASSERT_TRUE(LogShows("status Incoming call")) << Log();
+    ASSERT_TRUE(LogShows("status +447700900123")) << Log();
+    Key(1138);
+    ASSERT_TRUE(LogShows("status Voice call")) << Log();
+    EXPECT_EQ(Ctl("remote-hangup").second, 0);
+    ASSERT_TRUE(LogShows("status Call ended")) << Log();
+
+    // Rejected with End.
+    EXPECT_EQ(Ctl("ring +447700900124").second, 0);
+    ASSERT_TRUE(LogShows("status +447700900124")) << Log();
+    Key(1139);
+    ASSERT_TRUE(LogShows("status Unanswered")) << Log();
+
+    // A caller who gives up at once, and another right behind: both are logged, in order.
+    ASSERT_TRUE(
+        WaitFor([&] { return Ctl("status").first.find("call=none") != std::string::npos; }));
+    EXPECT_EQ(Ctl("ring +447700900125").second, 0);
+    ASSERT_TRUE(LogShows("status +447700900125")) << Log();
+    EXPECT_EQ(Ctl("caller-hangup").second, 0);
+    EXPECT_EQ(Ctl("ring +447700900126").second, 0);
+    ASSERT_TRUE(LogShows("status +447700900126")) << Log();
+    EXPECT_EQ(Ctl("caller-hangup").second, 0);
+    ASSERT_TRUE(WaitFor([&] { return Logged(3).size() == 3; }, 10s)) << Log();
+    EXPECT_EQ(Logged(3),
+              (std::vector<std::string>{"+447700900124", "+447700900125", "+447700900126"}));
+    EXPECT_EQ(Logged(1), std::vector<std::string>{"+447700900123"});
+
+    // A dial answered by the far end and ended here; a busy number. Each starts once the
+    // last result's two seconds are over and the pad is idle again.
+    ASSERT_TRUE(WaitFor([&] { return Count("status COSMOTE") == 2; })) << Log();
+    Type("0123456");
+    Key(1138);
+    ASSERT_TRUE(LogShows("status Dialing...")) << Log();
+    ASSERT_TRUE(
+        WaitFor([&] { return Ctl("status").first.find("call=dialing") != std::string::npos; }));
+    EXPECT_EQ(Ctl("remote-answer").second, 0);
+    ASSERT_TRUE(WaitFor([&] { return Count("status Voice call") == 2; })) << Log();
+    Key(1139);
+    ASSERT_TRUE(WaitFor([&] { return Count("status Call ended") == 2; })) << Log();
+    ASSERT_TRUE(
+        WaitFor([&] { return Ctl("status").first.find("call=none") != std::string::npos; }));
+    EXPECT_EQ(Ctl("busy 0123457").second, 0);
+    ASSERT_TRUE(WaitFor([&] { return Count("status COSMOTE") == 3; })) << Log();
+    Type("0123457");
+    Key(1138);
+    ASSERT_TRUE(LogShows("status Number is busy")) << Log();
+    EXPECT_EQ(Logged(2), (std::vector<std::string>{"0123456", "0123457"}));
+
+    kill(dialer_.Pid(), SIGTERM);
+    EXPECT_EQ(dialer_.WaitExit(10s), 0) << Read(temp_ / "dialer.out");
+}
+
+// A card that stops answering holds up neither the window nor the exit, and is taken for gone
+// once it stays silent.
+TEST_P(DialerProgramTest, ASilentCardIsTakenForGoneAndTheDialerStillExitsAtOnce) {
+    StartCard("--powered");
+    StartDialer("ok");
+    ASSERT_TRUE(LogShows("card 2 connected")) << Log();
+    EXPECT_EQ(Ctl("silent on").second, 0);
+    // Three call-list polls without an answer.
+    ASSERT_TRUE(LogShows("card silent: taken for gone", 40s)) << Log();
+    ASSERT_TRUE(WaitFor([&] { return Count("card 1 not connected") == 2; }, 5s)) << Log();
+    EXPECT_EQ(Ctl("silent off").second, 0);
+    ASSERT_TRUE(WaitFor([&] { return Count("card 2 connected") == 2; }, 20s)) << Log();
+
+    // Silent again, with a dial under way: Exit ends the program at once all the same.
+    ASSERT_TRUE(WaitFor([&] { return Count("status COSMOTE") >= 1; })) << Log();
+    EXPECT_EQ(Ctl("silent on").second, 0);
+    Type("0123456");
+    Key(1138);
+    ASSERT_TRUE(LogShows("status Dialing...")) << Log();
+    const auto start = std::chrono::steady_clock::now();
+    SendWindowMessage(DialerSocket(), 273, 40016, 0, 2000);
+    EXPECT_EQ(dialer_.WaitExit(10s), 0) << Read(temp_ / "dialer.out");
+    // The message folder's SIM commands still run on the window's thread, each bounded.
+    EXPECT_LT(std::chrono::steady_clock::now() - start, 5s);
+}
+
+INSTANTIATE_TEST_SUITE_P(Dialects, DialerProgramTest, ::testing::Values("card", "standard"));
 
 TEST(CommanderProgram, ReportsTheModemReadyWhileItsDeviceExists) {
     const testing::TempFolder temp;

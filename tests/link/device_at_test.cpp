@@ -331,20 +331,20 @@ TEST_F(DeviceWrappersTest, CardDialect) {
           {"AT+CLVL=11", "\r\nERROR\r\n"},
           {"AT+CLCC", Ok("+CLCC: 1,1,4,0,0,\"+447700900123\",145")}});
     char16_t maker[64], model[64], firmware[64];
-    EXPECT_EQ(device::GetCardIdentity(*link_, maker, 64, model, 64, firmware, 64), 1);
+    EXPECT_EQ(GetCardIdentity(*link_, maker, 64, model, 64, firmware, 64), 1);
     EXPECT_EQ(std::u16string(maker), u"Tavro Mobile Phones");
     EXPECT_EQ(std::u16string(model), u"TAVRO CARD PHONE 2.0");
     EXPECT_EQ(std::u16string(firmware), u"SW3.80");
-    EXPECT_FLOAT_EQ(device::GetFirmwareVersion(*link_, nullptr, 0), 3.80f);
-    EXPECT_EQ(Poll(device::GetSignalBars), 2);
+    EXPECT_FLOAT_EQ(GetFirmwareVersion(*link_, nullptr, 0), 3.80f);
+    EXPECT_EQ(Poll(GetSignalBars), 2);
     char16_t name[32];
-    EXPECT_EQ(device::GetOperatorName(*link_, name, 32), 1);
+    EXPECT_EQ(GetOperatorName(*link_, name, 32), 1);
     EXPECT_EQ(std::u16string(name), u"PANAFON");
-    EXPECT_EQ(Poll(device::GetSpeakerVolume), 7);
-    EXPECT_EQ(device::SetSpeakerVolume(*link_, 3), 0);
-    EXPECT_EQ(device::SetSpeakerVolume(*link_, 11), 4);
+    EXPECT_EQ(Poll(GetSpeakerVolume), 7);
+    EXPECT_EQ(SetSpeakerVolume(*link_, 3), 0);
+    EXPECT_EQ(SetSpeakerVolume(*link_, 11), 4);
     int state = -1, mode = -1;
-    EXPECT_EQ(device::QueryCallState(*link_, &state, &mode), kCallListCall);
+    EXPECT_EQ(QueryCallState(*link_, &state, &mode), kCallListCall);
     EXPECT_EQ(state, 4);
     EXPECT_EQ(mode, 0);
 }
@@ -356,19 +356,19 @@ TEST_F(DeviceWrappersTest, StandardModem) {
           {"AT+CLVL?", "\r\n+CME ERROR: 4\r\n"},
           {"AT+CLCC", "\r\n+CME ERROR: 100\r\n"}});
     char16_t text[64];
-    EXPECT_FLOAT_EQ(device::GetFirmwareVersion(*link_, text, 64), 0.0f);
+    EXPECT_FLOAT_EQ(GetFirmwareVersion(*link_, text, 64), 0.0f);
     EXPECT_EQ(std::u16string(text), u"REV1");
-    EXPECT_EQ(Poll(device::GetSignalBars), 4);
+    EXPECT_EQ(Poll(GetSignalBars), 4);
     char16_t name[32];
-    EXPECT_EQ(device::GetOperatorName(*link_, name, 32), 1);
+    EXPECT_EQ(GetOperatorName(*link_, name, 32), 1);
     EXPECT_EQ(std::u16string(name), u"Vodafone UK");
-    EXPECT_EQ(device::GetSpeakerVolume(*link_), -1);
-    EXPECT_EQ(device::QueryCallState(*link_, nullptr, nullptr), kCallListUnknown);
+    EXPECT_EQ(GetSpeakerVolume(*link_), -1);
+    EXPECT_EQ(QueryCallState(*link_, nullptr, nullptr), kCallListUnknown);
     {
         std::lock_guard<std::mutex> lock(repliesMutex_);
         replies_["AT+CLCC"] = Ok();
     }
-    EXPECT_EQ(device::QueryCallState(*link_, nullptr, nullptr), kCallListEmpty);
+    EXPECT_EQ(QueryCallState(*link_, nullptr, nullptr), kCallListEmpty);
 }
 
 }  // namespace

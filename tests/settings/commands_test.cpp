@@ -92,10 +92,13 @@ TEST_F(CommandsTest, NetworkSelection) {
     char16_t name[kOperatorNameSize] = u"old";
     EXPECT_EQ(CurrentOperatorName(*link_, name, kOperatorNameSize), 1);
     EXPECT_EQ(std::u16string(name), u"PANAFON");
-    // A quoted alphanumeric answer cannot be named and leaves the old text.
-    Answer("AT+COPS?", "\r\n+COPS: 0,0,\"PANAFON\"\r\n\r\nOK\r\n");
+    // A modem's own alphanumeric name is shown as it is; no operator leaves the old text.
+    Answer("AT+COPS?", "\r\n+COPS: 0,0,\"Vodafone UK\"\r\n\r\nOK\r\n");
+    EXPECT_EQ(CurrentOperatorName(*link_, name, kOperatorNameSize), 1);
+    EXPECT_EQ(std::u16string(name), u"Vodafone UK");
+    Answer("AT+COPS?", "\r\n+COPS: 0\r\n\r\nOK\r\n");
     EXPECT_EQ(CurrentOperatorName(*link_, name, kOperatorNameSize), 0);
-    EXPECT_EQ(std::u16string(name), u"PANAFON");
+    EXPECT_EQ(std::u16string(name), u"Vodafone UK");
     Answer("AT+COPS?", kError);
     EXPECT_EQ(NetworkMode(*link_), -1);
 
@@ -110,7 +113,7 @@ TEST_F(CommandsTest, NetworkSelection) {
     EXPECT_EQ(NetworkSearch(*link_, names, 4, &count), -1);
     EXPECT_EQ(Sent(),
               (Lines{"AT+COPS=1,2,20201", "AT+COPS=1,2,20201", "AT+COPS=0", "AT+COPS=0", "AT+COPS?",
-                     "AT+COPS?", "AT+COPS?", "AT+COPS?", "AT+COPS=?", "AT+COPS=?"}));
+                     "AT+COPS?", "AT+COPS?", "AT+COPS?", "AT+COPS?", "AT+COPS=?", "AT+COPS=?"}));
 }
 
 TEST_F(CommandsTest, Forwarding) {
