@@ -67,9 +67,10 @@ TEST(ReplyFramer, AnUnsolicitedLineAnywhereIsTakenOutOnce) {
             for (size_t at = 0; at <= stream.size(); ++at) {
                 // A modem sends each "\r\n<line>\r\n" whole: inside the reply an
                 // unsolicited line comes only between two of them.
-                const bool lineEdge = at == e.echo.size() || at == stream.size() ||
-                                      (stream[at - 1] == '\n' && stream[at] == '\r');
-                if (at > e.echo.size() && !lineEdge) continue;
+                const bool inEcho = at <= e.echo.size();
+                const bool lineEdge = at == stream.size() ||
+                                      (!inEcho && stream[at - 1] == '\n' && stream[at] == '\r');
+                if (!inEcho && !lineEdge) continue;
                 if (at > e.echo.size() && std::string(e.reply).rfind("> ") == e.reply.size() - 2 &&
                     at == stream.size())
                     continue;  // after the prompt the card waits for text, not lines
