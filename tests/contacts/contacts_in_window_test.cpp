@@ -3,6 +3,9 @@
 // the card, and a call from its number rings on the DialPad with the new name.
 #include <gtest/gtest.h>
 
+#include <atomic>
+#include <thread>
+
 #include <QApplication>
 #include <QLabel>
 #include <QLineEdit>
@@ -20,6 +23,7 @@
 #include "shell/card_watch.h"
 #include "shell/dialogs.h"
 #include "shell/main_window.h"
+#include "shell/message_layer.h"
 #include "shell/messages.h"
 #include "shell/view_factories.h"
 #include "support/settings_store.h"
@@ -36,10 +40,22 @@ class SimHost : public CardHost {
     bool CompanionExists() override { return false; }
     std::optional<long> SendCompanion(unsigned) override { return std::nullopt; }
     int OpenLink() override { return PortOpenDevice(link_, device.c_str()); }
-    void CloseLink() override { PortClose(link_); }
+    // The listener may be waiting for the window's thread to take a ring: keep delivering
+    // while the port closes, or joining the listener would wait for ever.
+    void CloseLink() override {
+        if (!messages || !messages->OnOwnerThread()) return PortClose(link_);
+        std::atomic<bool> closed{false};
+        std::thread closer([&] {
+            PortClose(link_);
+            closed = true;
+        });
+        messages->WaitWhileDelivering([&] { return closed.load(); });
+        closer.join();
+    }
     int CardPresent() override { return 1; }
     void Sleep(int) override {}
     std::string device;
+    MessageLayer* messages = nullptr;
 
   private:
     Link& link_;
@@ -87,6 +103,7 @@ TEST(ContactsInWindowTest, ANewContactsCallRingsWithItsName) {
     {
         MainWindow window(context, DefaultViewFactories(), &host);
         window.StopWatchTimer();
+        host.messages = &window.Messages();
         ASSERT_EQ(host.OpenLink(), 1);
         window.Watch().SetCardState(2);
         auto* contacts = dynamic_cast<ManageContactsView*>(window.ViewAt(kViewManageContacts));
@@ -111,7 +128,7 @@ TEST(ContactsInWindowTest, ANewContactsCallRingsWithItsName) {
             << text(kStatusLine2Id);
         EXPECT_EQ(window.Views().current, kViewDialPad);
         sim.Control("caller-hangup");
-        PortClose(link);
+        host.CloseLink();
     }
 }
 
