@@ -29,6 +29,7 @@
 #include "support/local_socket.h"
 #include "support/settings_store.h"
 #include "support/text.h"
+#include "tests/common/sim_card_host.h"
 #include "tests/common/temp_folder.h"
 
 namespace vqm {
@@ -36,39 +37,7 @@ namespace {
 
 using std::chrono::milliseconds;
 
-// The card manager's side for the window: the link opens on the simulated card's device and
-// closes while the window keeps taking the listener's messages.
-class SimCardHost : public CardHost {
-  public:
-    explicit SimCardHost(Link& link) : link_(link) {}
-    bool CompanionExists() override { return companion; }
-    std::optional<long> SendCompanion(unsigned msg) override {
-        if (!companion) return std::nullopt;
-        if (msg == kMsgCardPowerUp) power = 1;
-        return msg == kMsgCardPowerQuery ? power : 1;
-    }
-    int OpenLink() override { return PortOpenDevice(link_, device.c_str()); }
-    void CloseLink() override {
-        if (!messages || !messages->OnOwnerThread()) return PortClose(link_);
-        std::atomic<bool> closed{false};
-        std::thread closer([&] {
-            PortClose(link_);
-            closed = true;
-        });
-        messages->WaitWhileDelivering([&] { return closed.load(); });
-        closer.join();
-    }
-    int CardPresent() override { return 1; }
-    void Sleep(int) override {}
-
-    std::string device;
-    MessageLayer* messages = nullptr;
-    bool companion = false;  // the card manager is there
-    long power = 1;          // its answer to the power query
-
-  private:
-    Link& link_;
-};
+using testing::SimCardHost;
 
 constexpr char kKnownNumber[] = "+447700900123";
 

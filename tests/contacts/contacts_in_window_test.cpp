@@ -3,9 +3,6 @@
 // the card, and a call from its number rings on the DialPad with the new name.
 #include <gtest/gtest.h>
 
-#include <atomic>
-#include <thread>
-
 #include <QApplication>
 #include <QLabel>
 #include <QLineEdit>
@@ -28,38 +25,13 @@
 #include "shell/view_factories.h"
 #include "support/settings_store.h"
 #include "support/text.h"
+#include "tests/common/sim_card_host.h"
 #include "tests/common/temp_folder.h"
 
 namespace vqm {
 namespace {
 
-// The card manager's side: the link opens on the simulated card's device.
-class SimHost : public CardHost {
-  public:
-    explicit SimHost(Link& link) : link_(link) {}
-    bool CompanionExists() override { return false; }
-    std::optional<long> SendCompanion(unsigned) override { return std::nullopt; }
-    int OpenLink() override { return PortOpenDevice(link_, device.c_str()); }
-    // The listener may be waiting for the window's thread to take a ring: keep delivering
-    // while the port closes, or joining the listener would wait for ever.
-    void CloseLink() override {
-        if (!messages || !messages->OnOwnerThread()) return PortClose(link_);
-        std::atomic<bool> closed{false};
-        std::thread closer([&] {
-            PortClose(link_);
-            closed = true;
-        });
-        messages->WaitWhileDelivering([&] { return closed.load(); });
-        closer.join();
-    }
-    int CardPresent() override { return 1; }
-    void Sleep(int) override {}
-    std::string device;
-    MessageLayer* messages = nullptr;
-
-  private:
-    Link& link_;
-};
+using testing::SimCardHost;
 
 bool WaitFor(const std::function<bool()>& done) {
     const auto until = std::chrono::steady_clock::now() + std::chrono::seconds(30);
@@ -98,7 +70,7 @@ TEST(ContactsInWindowTest, ANewContactsCallRingsWithItsName) {
     ShellContext context{settings, link, dialogs, temp / "run"};
     context.callLog = &callLog;
     context.caches = &caches;
-    SimHost host(link);
+    SimCardHost host(link);
     host.device = sim.DevicePath();
     {
         MainWindow window(context, DefaultViewFactories(), &host);

@@ -25,6 +25,7 @@
 #include "shell/view_factories.h"
 #include "support/settings_store.h"
 #include "support/text.h"
+#include "tests/common/sim_card_host.h"
 #include "tests/common/temp_folder.h"
 
 namespace vqm {
@@ -32,32 +33,7 @@ namespace {
 
 using std::chrono::milliseconds;
 
-// The card manager's side: the link opens on the simulated card's device.
-class SimCardHost : public CardHost {
-  public:
-    explicit SimCardHost(Link& link) : link_(link) {}
-    bool CompanionExists() override { return false; }
-    std::optional<long> SendCompanion(unsigned) override { return std::nullopt; }
-    int OpenLink() override { return PortOpenDevice(link_, device.c_str()); }
-    void CloseLink() override {
-        if (!messages || !messages->OnOwnerThread()) return PortClose(link_);
-        std::atomic<bool> closed{false};
-        std::thread closer([&] {
-            PortClose(link_);
-            closed = true;
-        });
-        messages->WaitWhileDelivering([&] { return closed.load(); });
-        closer.join();
-    }
-    int CardPresent() override { return 1; }
-    void Sleep(int) override {}
-
-    std::string device;
-    MessageLayer* messages = nullptr;
-
-  private:
-    Link& link_;
-};
+using testing::SimCardHost;
 
 constexpr char kKnownNumber[] = "+447700900123";
 
