@@ -1,5 +1,8 @@
 #include "calls/event_log.h"
 
+#include <sys/stat.h>
+#include <unistd.h>
+
 #include <cstdio>
 #include <cstring>
 #include <ctime>
@@ -91,6 +94,16 @@ int EventLog::EventLogAppend(const EventRecord& record) {
     std::lock_guard<std::mutex> lock(mutex_);
     FILE* file = std::fopen(path_.c_str(), "a+b");
     if (!file) return 0;
+    // A crash in the middle of an earlier append can leave part of a record at the end; a new
+    // record written after it would shift every later record, so the torn tail goes first.
+    struct stat info {};
+    if (fstat(fileno(file), &info) == 0) {
+        const off_t torn = info.st_size % static_cast<off_t>(kEventRecordSize);
+        if (torn != 0 && ftruncate(fileno(file), info.st_size - torn) != 0) {
+            std::fclose(file);
+            return 0;
+        }
+    }
     unsigned char bytes[kEventRecordSize];
     EncodeEventRecord(record, bytes);
     bool ok = std::fwrite(bytes, 1, sizeof bytes, file) == sizeof bytes && FlushToDisk(file);

@@ -128,6 +128,52 @@ TEST_F(EventLogTest, PartialAndDamagedRecordsAreSafe) {
     EXPECT_EQ(record.length, std::strlen(record.text));
 }
 
+// A crash in the middle of an append leaves part of a record at the end, cut at any byte. The
+// whole records before it stay readable, and the next append or pop drops the torn part instead
+// of letting it shift every later record.
+TEST_F(EventLogTest, TornTailIsDroppedByTheNextAppendOrPop) {
+    const std::vector<std::string> lines = {"+CRING: VOICE", "+CLIP: \"0123\",129",
+                                            "+CMTI: \"SM\",7"};
+    // Every append and pop syncs the file: thousands of them run in memory, not on the disk.
+    const testing::TempFolder memory(std::filesystem::is_directory("/dev/shm") ? "/dev/shm"
+                                                                                : "/tmp");
+    const std::string path = memory / "event.log";
+    for (size_t whole : {size_t{0}, size_t{2}}) {
+        for (size_t cut = 1; cut < kEventRecordSize; ++cut) {
+            SCOPED_TRACE("whole records " + std::to_string(whole) + ", cut at byte " +
+                         std::to_string(cut));
+            for (bool popFirst : {false, true}) {
+                fs::remove(path);
+                EventLog log(path);
+                for (size_t i = 0; i <= whole; ++i)
+                    ASSERT_EQ(log.EventLogAppend(Record(kEventNewMessage, lines[i])), 1);
+                fs::resize_file(path, whole * kEventRecordSize + cut);
+                ASSERT_EQ(log.EventLogCount(), static_cast<int>(whole));
+
+                std::vector<std::string> expected(lines.begin(), lines.begin() + whole);
+                std::vector<std::string> seen;
+                if (popFirst && whole > 0) {
+                    EventRecord first{};
+                    ASSERT_EQ(log.EventLogPop(&first), 1);
+                    seen.emplace_back(first.text);
+                    ASSERT_EQ(fs::file_size(path), (whole - 1) * kEventRecordSize);
+                }
+                ASSERT_EQ(log.EventLogAppend(Record(kEventRing, "+CRING: AFTER")), 1);
+                expected.emplace_back("+CRING: AFTER");
+                ASSERT_EQ(fs::file_size(path),
+                          (expected.size() - seen.size()) * kEventRecordSize);
+                for (int n = log.EventLogCount(); n > 0; --n) {
+                    EventRecord record{};
+                    ASSERT_EQ(log.EventLogPop(&record), 1);
+                    seen.emplace_back(record.text);
+                }
+                EXPECT_EQ(seen, expected);
+                EXPECT_FALSE(fs::exists(path));
+            }
+        }
+    }
+}
+
 TEST_F(EventLogTest, MissingFolderLosesTheEventQuietly) {
     EventLog log(folder_ + "/no-such-folder/event.log");
     EXPECT_EQ(log.EventLogAppend(Record(kEventRing, "+CRING: VOICE")), 0);

@@ -10,9 +10,11 @@ namespace vqm::testing {
 
 class TempFolder {
   public:
-    TempFolder() {
-        char pattern[] = "/tmp/vqm-test-XXXXXX";
-        const char* made = mkdtemp(pattern);
+    // parent: where the folder goes; a test that syncs thousands of small files picks a
+    // memory-backed one.
+    explicit TempFolder(const std::string& parent = "/tmp") {
+        std::string pattern = parent + "/vqm-test-XXXXXX";
+        const char* made = mkdtemp(pattern.data());
         path_ = made ? made : "";
     }
     ~TempFolder() {
