@@ -22,13 +22,14 @@ constexpr char kClckTag[] = "+CLCK:";
 constexpr size_t kPasswordSize = 32;
 
 int SendLockCommand(Link& link, int facility, int mode, const char16_t* password,
-                    int serviceClass) {
+                    int serviceClass, CardError* error) {
     char narrow[kPasswordSize] = "";
     if (password) WideToNarrowBounded(password, narrow, sizeof narrow);
+    if (!settings_detail::Quotable(narrow)) return -1;
     char command[80];
     std::snprintf(command, sizeof command, "AT+CLCK=\"%s\",%d,\"%s\",%d\r", kFacilities[facility],
                   mode, narrow, serviceClass);
-    return CommandResult(link, command);
+    return CommandResult(link, command, error);
 }
 
 }  // namespace
@@ -37,10 +38,11 @@ const char* BarringFacility(int facility) {
     return facility >= 0 && facility < kBarringFacilityCount ? kFacilities[facility] : nullptr;
 }
 
-int ParseBarringReply(const char* reply, int length, int serviceClass) {
+int ParseBarringReply(const char* reply, int length, int serviceClass, CardError* error) {
+    if (error) *error = CardError{};
     if (!reply || length <= 0) return -1;
     FieldCursor cursor(reply, length);
-    if (!cursor.SeekPast(kClckTag)) return AtFinalResult(reply, length);
+    if (!cursor.SeekPast(kClckTag)) return SettingsResult(reply, length, error);
     int32_t status = 0, reportedClass = 0;
     const int fields = settings_detail::ScanStatusAndClass(cursor, &status, &reportedClass);
     if (fields == 0) return -1;
@@ -49,27 +51,32 @@ int ParseBarringReply(const char* reply, int length, int serviceClass) {
     return (reportedClass & serviceClass & 0xFF) != 0 ? 1 : 0;
 }
 
-int QueryBarring(Link& link, int serviceClass, int facility) {
+int QueryBarring(Link& link, int serviceClass, int facility, CardError* error) {
+    if (error) *error = CardError{};
     if (serviceClass < 1 || serviceClass > 4 || !BarringFacility(facility)) return -1;
     char command[32], reply[256];
     std::snprintf(command, sizeof command, "AT+CLCK=\"%s\",2\r", kFacilities[facility]);
     const int length = static_cast<int>(AtCommand(link, command, reply, sizeof reply));
     if (length == 0) return -1;
-    return ParseBarringReply(reply, length, serviceClass);
+    return ParseBarringReply(reply, length, serviceClass, error);
 }
 
-int LockBarring(Link& link, int serviceClass, int facility, const char16_t* password) {
+int LockBarring(Link& link, int serviceClass, int facility, const char16_t* password,
+                CardError* error) {
+    if (error) *error = CardError{};
     if (serviceClass < 1 || serviceClass > 4 || facility < 0 || facility > 4) return 0;
-    return SendLockCommand(link, facility, 1, password, serviceClass);
+    return SendLockCommand(link, facility, 1, password, serviceClass, error);
 }
 
-int UnlockBarring(Link& link, int serviceClass, int facility, const char16_t* password) {
+int UnlockBarring(Link& link, int serviceClass, int facility, const char16_t* password,
+                  CardError* error) {
+    if (error) *error = CardError{};
     if (serviceClass < 1 || serviceClass > 4 || facility < 5 || facility > 7) return 0;
-    return SendLockCommand(link, facility, 0, password, serviceClass);
+    return SendLockCommand(link, facility, 0, password, serviceClass, error);
 }
 
-int UnlockAllBarrings(Link& link, const char16_t* password) {
-    return SendLockCommand(link, kAllBarrings, 0, password, 7);
+int UnlockAllBarrings(Link& link, const char16_t* password, CardError* error) {
+    return SendLockCommand(link, kAllBarrings, 0, password, 7, error);
 }
 
 }  // namespace vqm

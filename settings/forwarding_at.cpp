@@ -40,49 +40,57 @@ int ParseForwardReply(const char* reply, int length, char16_t* number, size_t nu
     return 1;
 }
 
-int QueryForward(Link& link, int serviceClass, int reason, char16_t* number, size_t numberSize) {
+int QueryForward(Link& link, int serviceClass, int reason, char16_t* number, size_t numberSize,
+                 CardError* error) {
+    if (error) *error = CardError{};
     if (!ValidPair(serviceClass, reason)) return -1;
     char command[32], reply[256];
     std::snprintf(command, sizeof command, "AT+CCFC=%d,2,,,%d\r", reason, serviceClass);
     const int length = static_cast<int>(AtCommand(link, command, reply, sizeof reply));
     if (length == 0) return -1;
+    ParseCardError(reply, length, error);
     return ParseForwardReply(reply, length, number, numberSize);
 }
 
-int ActivateForward(Link& link, int serviceClass, int reason, const char16_t* number, int seconds) {
+int ActivateForward(Link& link, int serviceClass, int reason, const char16_t* number, int seconds,
+                    CardError* error) {
+    if (error) *error = CardError{};
     if (!ValidPair(serviceClass, reason) || !number) return -1;
     char narrow[32];
     WideToNarrowBounded(number, narrow, sizeof narrow);
+    if (!settings_detail::Quotable(narrow)) return -1;
     const int type = std::strchr(narrow, '+') ? 145 : 129;
     char command[96];
     std::snprintf(command, sizeof command, "AT+CCFC=%d,3,\"%s\",%d,%d,,,%d\r", reason, narrow, type,
                   serviceClass, seconds);
-    return CommandResult(link, command);
+    return CommandResult(link, command, error);
 }
 
-int EraseForward(Link& link, int serviceClass, int reason) {
+int EraseForward(Link& link, int serviceClass, int reason, CardError* error) {
+    if (error) *error = CardError{};
     if (!ValidPair(serviceClass, reason)) return -1;
     char command[32];
     std::snprintf(command, sizeof command, "AT+CCFC=%d,4,,,%d\r", reason, serviceClass);
-    return CommandResult(link, command);
+    return CommandResult(link, command, error);
 }
 
-int DisableAllForwards(Link& link, int serviceClass) {
+int DisableAllForwards(Link& link, int serviceClass, CardError* error) {
+    if (error) *error = CardError{};
     // Reason 4 is every forward, mode 0 disables.
     switch (serviceClass) {
         case 1:
-            return CommandResult(link, "AT+CCFC=4,0,,,1\r");
+            return CommandResult(link, "AT+CCFC=4,0,,,1\r", error);
         case 2:
-            return CommandResult(link, "AT+CCFC=4,0,,,2\r");
+            return CommandResult(link, "AT+CCFC=4,0,,,2\r", error);
         case 4:
-            return CommandResult(link, "AT+CCFC=4,0,,,4\r");
+            return CommandResult(link, "AT+CCFC=4,0,,,4\r", error);
         default:
             return -1;
     }
 }
 
-int DisableAllForwardsAllClasses(Link& link) {
-    return CommandResult(link, "AT+CCFC=4,0,,,7\r");
+int DisableAllForwardsAllClasses(Link& link, CardError* error) {
+    return CommandResult(link, "AT+CCFC=4,0,,,7\r", error);
 }
 
 }  // namespace vqm

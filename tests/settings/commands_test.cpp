@@ -3,6 +3,9 @@
 #include <gtest/gtest.h>
 
 #include <chrono>
+#include <cstring>
+#include <iterator>
+#include <functional>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -186,11 +189,96 @@ TEST_F(CommandsTest, BarringAndCodes) {
     Answer("AT+CLCK=\"AO\",2", kError);
     EXPECT_EQ(QueryBarring(*link_, 1, 0), 4);  // a failure, not "not barred"
     Answer("AT+CLCK=\"OI\",1,\"1111\",1", "\r\n+CME ERROR: 16\r\n");
-    EXPECT_EQ(LockBarring(*link_, 1, 1, u"1111"), -1);  // no final result the link knows
+    CardError error;
+    EXPECT_EQ(LockBarring(*link_, 1, 1, u"1111", &error), 4);  // a refusal, not a lost answer
+    EXPECT_STREQ(CardErrorReason(error), "incorrect password");
     Answer("AT+CLCK=\"P2\",2", "\r\n+CLCK: 1\r\n\r\nOK\r\n");
     EXPECT_EQ(QueryLock(*link_, 1), 1);
     Answer("AT+CPWD=\"SC\",\"1\",\"2\",7", kError);
     EXPECT_EQ(ChangeCode(*link_, 0, u"1", u"2"), 4);
+}
+
+// What the card refuses with, whichever wrapper asked: the result is a failure (4) and the
+// reason is the card's; an answer that is no refusal leaves no reason behind.
+TEST_F(CommandsTest, CardRefusalsAreFailuresWithTheirReason) {
+    struct Case {
+        const char* command;
+        std::function<int(CardError*)> call;
+    };
+    const Case cases[] = {
+        {"AT+CCFC=1,4,,,1", [&](CardError* e) { return EraseForward(*link_, 1, 1, e); }},
+        {"AT+CCFC=0,3,\"0123\",129,2,,,20",
+         [&](CardError* e) { return ActivateForward(*link_, 2, 0, u"0123", 20, e); }},
+        {"AT+CCFC=4,0,,,7", [&](CardError* e) { return DisableAllForwardsAllClasses(*link_, e); }},
+        {"AT+CLCK=\"AO\",2", [&](CardError* e) { return QueryBarring(*link_, 1, 0, e); }},
+        {"AT+CLCK=\"AB\",0,\"0000\",7",
+         [&](CardError* e) { return UnlockAllBarrings(*link_, u"0000", e); }},
+        {"AT+CLCK=\"SC\",2", [&](CardError* e) { return QueryLock(*link_, 0, e); }},
+        {"AT+CLCK=\"SC\",1,\"1234\",7", [&](CardError* e) { return SetLock(*link_, 0, 1, u"1234", e); }},
+        {"AT+CPWD=\"SC\",\"1234\",\"4321\",7",
+         [&](CardError* e) { return ChangeCode(*link_, 0, u"1234", u"4321", e); }},
+    };
+    // Each wrapper meets one kind of refusal; the reading of every kind is the table below.
+    const char* refusals[] = {"\r\n+CME ERROR: 12\r\n", "\r\n+CME ERROR: 16\r\n",
+                              "\r\n+CMS ERROR: 311\r\n", "\r\n+CME ERROR: SIM busy\r\n"};
+    int n = 0;
+    for (const Case& c : cases) {
+        const char* refusal = refusals[n++ % std::size(refusals)];
+        Answer(c.command, refusal);
+        CardError error;
+        EXPECT_EQ(c.call(&error), 4) << c.command << " " << refusal;
+        EXPECT_NE(error.kind, CardError::None) << c.command;
+        Answer(c.command, kError);
+        EXPECT_EQ(c.call(&error), 4) << c.command;
+        EXPECT_EQ(error.kind, CardError::None) << c.command;
+        Sent();
+    }
+}
+
+TEST(CardErrorTest, ReplyResultAndReason) {
+    struct Case {
+        const char* reply;
+        int result;
+        const char* reason;
+    };
+    const Case cases[] = {
+        {"\r\n+CME ERROR: 12\r\n", 4, "SIM PUK required"},
+        {"\r\n+CME ERROR: 4\r\n", 4, "operation not supported"},
+        {"\r\n+CME ERROR: 16\r\n", 4, "incorrect password"},
+        {"\r\n+CME ERROR: incorrect password\r\n", 4, "incorrect password"},
+        {"\r\n+CMS ERROR: 311\r\n", 4, "SIM PIN required"},
+        {"\r\n+CME ERROR: 777\r\n", 4, "error reported by the card"},
+        {"\r\n+CME ERROR: -3\r\n", 4, "-3"},
+        {"\r\n+CME ERROR:\r\n", 4, ""},
+        // Only a line that opens with the tag is a report; OK and ERROR keep their codes.
+        {"\r\n+CCFC: 1,1,\"+CME ERROR: 12\",145\r\n\r\nOK\r\n", 0, ""},
+        {"\r\nERROR\r\n", 4, ""},
+        {"\r\nOK\r\n", 0, ""},
+        {"\r\nBUSY\r\n", 7, ""},
+        {"\r\n+CCFC: 0,1\r\n", -1, ""},
+    };
+    for (const Case& c : cases) {
+        CardError error;
+        error.kind = CardError::Message;  // stale: the reading must clear it
+        EXPECT_EQ(SettingsResult(c.reply, static_cast<int>(std::strlen(c.reply)), &error),
+                  c.result)
+            << c.reply;
+        EXPECT_STREQ(CardErrorReason(error), c.reason) << c.reply;
+    }
+}
+
+// A quote or a line end inside a code or number would end the command's field or the command
+// itself early: such text never reaches the card.
+TEST_F(CommandsTest, TextThatWouldBreakTheCommandIsNotSent) {
+    for (const char16_t* text : {u"12\"4", u"\"", u"12\r4", u"1;\n"}) {
+        EXPECT_EQ(LockBarring(*link_, 1, 0, text), -1);
+        EXPECT_EQ(UnlockAllBarrings(*link_, text), -1);
+        EXPECT_EQ(SetLock(*link_, 0, 1, text), -1);
+        EXPECT_EQ(ChangeCode(*link_, 0, text, u"1234"), -1);
+        EXPECT_EQ(ChangeCode(*link_, 0, u"1234", text), -1);
+        EXPECT_EQ(ActivateForward(*link_, 1, 0, text, 20), -1);
+    }
+    EXPECT_TRUE(Sent().empty());
 }
 
 }  // namespace
