@@ -1,0 +1,104 @@
+#include "settings/settings_view.h"
+
+#include <QTabBar>
+
+#include "shell/messages.h"
+
+namespace vqm {
+
+namespace {
+
+using PageFactory = View* (*)(QWidget* parent, ShellContext& context);
+
+template <class Page>
+View* Make(QWidget* parent, ShellContext& context) {
+    return new Page(parent, context);
+}
+// A page whose class is still being written: an empty window of its class.
+View* Empty(QWidget* parent, ShellContext&) {
+    return new View(parent);
+}
+
+struct PageInfo {
+    const char16_t* caption;
+    const char* className;
+    PageFactory make;
+};
+
+// ---- The settings pages, in tab order. A page's builder swaps Empty for Make<ItsPage>. ----
+const PageInfo kPages[kSettingsPageCount] = {
+    {u"General", "SETTINGS_GENERAL_PAGE", Empty},
+    {u"Messages", "SETTINGS_MESSAGES_PAGE", Empty},
+    {u"Network", "SETTINGS_NETWORK_PAGE", Empty},
+    {u"Call Forward", "SETTINGS_CALLFORWARD_PAGE", Empty},
+    {u"Call Barring", "SETTINGS_CALLBARRING_PAGE", Empty},
+    {u"Security", "SETTINGS_SECURITY_PAGE", Empty},
+    {u"Modem", "SETTINGS_MODEM_PAGE", Empty},
+    {u"Call Waiting", "SETTINGS_CALLWAITING_PAGE", Empty},
+    {u"Tones", "SETTINGS_TONES_PAGE", Empty},
+};
+// ---- end of the pages ----
+
+}  // namespace
+
+SettingsView::SettingsView(QWidget* parent, ShellContext& context)
+    : View(parent), context_(context) {
+    cardState_ = [&context] {
+        return context.mainWindow ? context.mainWindow->App().cardState : 0;
+    };
+    // Laid out at the size the main window gives its views, before the shell places us.
+    if (parent)
+        resize(parent->width(), parent->height() - kMenuBarHeight);
+    else
+        resize(240, 320 - kMenuBarHeight);
+
+    for (const PageInfo& info : kPages) {
+        ViewRecord record;
+        record.caption = info.caption;
+        record.className = info.className;
+        record.windowProc = [this, make = info.make](QWidget* pageParent) -> View* {
+            return make(pageParent, context_);
+        };
+        pages_.records.push_back(std::move(record));
+    }
+    CreateTabbedPages(this, kSettingsTabId, pages_, rect());
+    // Nine titles do not fit 240 pixels: the strip keeps one row and scrolls with its arrows,
+    // each title whole.
+    if (auto* tabs = qobject_cast<QTabBar*>(FindControl(this, kSettingsTabId))) {
+        tabs->setUsesScrollButtons(true);
+        tabs->setElideMode(Qt::ElideNone);
+        tabs->setExpanding(false);
+    }
+    FollowCardState();
+}
+
+View* SettingsView::Page(int index) const {
+    return index >= 0 && index < pages_.Count() ? pages_.records[index].window : nullptr;
+}
+
+void SettingsView::SetCardStateSource(std::function<int()> source) {
+    cardState_ = std::move(source);
+    FollowCardState();
+}
+
+void SettingsView::FollowCardState() {
+    // Every page works on the card or on settings the card acts on: none of it is for a
+    // card that is not there.
+    setEnabled(cardState_() == 2);
+}
+
+long SettingsView::OnMessage(unsigned msg, long wParam, long lParam) {
+    if (msg == kMsgCardStateChanged) FollowCardState();
+    // The view coming forward shows its current page again; the card's news is for every page.
+    if (msg == kMsgViewShown) {
+        View* page = Page(pages_.current);
+        return page ? page->OnMessage(msg, wParam, lParam) : 0;
+    }
+    if (msg == kMsgCardStateChanged) {
+        for (ViewRecord& record : pages_.records)
+            if (record.window) record.window->OnMessage(msg, wParam, lParam);
+    }
+    return 0;
+}
+
+}  // namespace vqm
