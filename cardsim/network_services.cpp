@@ -20,6 +20,8 @@ constexpr int kClassBits[NetworkServices::kClasses] = {1, 2, 4};
 constexpr int kNotAllowed = 3;
 constexpr int kNotSupported = 4;
 constexpr int kWrongPassword = 16;
+constexpr int kPukRequired = 12;
+constexpr int kPuk2Required = 18;
 constexpr int kNoNetwork = 30;
 
 using Field = Argument;
@@ -125,8 +127,27 @@ void NetworkServices::FillDemo() {
     locked_ = {false, true, false};  // PIN2 is always asked for; PIN and phone lock are off
     codes_ = {"1234", "5678", "12345"};
     barringPassword_ = "0000";
+    tries_ = {kPinTries, kPinTries};
     bearer_ = {7, 0, 1};
     hscsd_ = {0, 0, 0, 0};
+}
+
+Handled NetworkServices::CheckPin(int lock, const std::string& given, std::string& errorText) {
+    if (lock > 1) {
+        // The phone code has no tries to lose.
+        return given == codes_[lock] ? Handled::Ok : Cme(errorText, kWrongPassword);
+    }
+    if (tries_[lock] == 0) return Cme(errorText, lock == 0 ? kPukRequired : kPuk2Required);
+    if (given == codes_[lock]) {
+        if (tries_[lock] != kPinTries && engine_) engine_->MarkChanged();
+        tries_[lock] = kPinTries;
+        return Handled::Ok;
+    }
+    --tries_[lock];
+    if (engine_) engine_->MarkChanged();
+    // The third wrong PIN already answers as the blocked SIM does.
+    if (tries_[lock] == 0) return Cme(errorText, lock == 0 ? kPukRequired : kPuk2Required);
+    return Cme(errorText, kWrongPassword);
 }
 
 int NetworkServices::CurrentCode() const {
@@ -351,11 +372,13 @@ Handled NetworkServices::RunClck(const std::string& args, std::string& info,
     }
     const int lock = LockIndex(facility);
     if (lock < 0) return Cme(errorText, kNotSupported);
+    // A blocked SIM answers nothing about its PIN until it is unblocked.
+    if (lock == 0 && tries_[0] == 0) return Cme(errorText, kPukRequired);
     if (mode == 2) {
         Line(info, std::string("+CLCK: ") + (locked_[lock] ? "1" : "0"));
         return Handled::Ok;
     }
-    if (password != codes_[lock]) return Cme(errorText, kWrongPassword);
+    if (CheckPin(lock, password, errorText) != Handled::Ok) return Handled::Error;
     locked_[lock] = mode == 1;
     if (engine_) engine_->MarkChanged();
     return Handled::Ok;
@@ -371,9 +394,15 @@ Handled NetworkServices::RunCpwd(const std::string& args, std::string& errorText
     // Every barring facility shares the one network password.
     if (lock < 0 && !BarringGroup(facility)) return Cme(errorText, kNotSupported);
     // A SIM will not change a PIN whose request is switched off.
+    if (lock >= 0 && lock <= 1 && tries_[lock] == 0)
+        return Cme(errorText, lock == 0 ? kPukRequired : kPuk2Required);
     if (lock >= 0 && lock <= 1 && !locked_[lock]) return Cme(errorText, kNotAllowed);
     std::string& current = lock >= 0 ? codes_[lock] : barringPassword_;
-    if (oldCode != current) return Cme(errorText, kWrongPassword);
+    if (lock >= 0) {
+        if (CheckPin(lock, oldCode, errorText) != Handled::Ok) return Handled::Error;
+    } else if (oldCode != current) {
+        return Cme(errorText, kWrongPassword);
+    }
     if (lock >= 0 ? !AllDigits(newCode, 4, 8) : !AllDigits(newCode, 4, 4))
         return Cme(errorText, kNotAllowed);
     current = newCode;
@@ -439,6 +468,9 @@ std::string NetworkServices::Control(const std::string& command, const std::stri
         if ((lock < 0 && !BarringGroup(facility)) || !AllDigits(code, 4, 8))
             return "ERROR: password needs SC|P2|PS|AB and a code of 4 to 8 digits";
         (lock >= 0 ? codes_[lock] : barringPassword_) = code;
+    } else if (command == "sim-reset") {
+        // What the PUK would do: both PINs get their tries back, the codes stay.
+        tries_ = {kPinTries, kPinTries};
     } else {
         return {};
     }
@@ -452,7 +484,8 @@ std::string NetworkServices::ControlHelp() const {
            "  forward REASON CLASS on|off [NUMBER]   forwarding (reason 0 all, 1 busy,\n"
            "                           2 no reply, 3 not reachable; class 1 voice, 2 data, 4 fax)\n"
            "  barring FAC CLASS on|off call barring AO, OI, OX, AI, IR (AB, AG, AC lift groups)\n"
-           "  password FAC CODE        the PIN (SC), PIN2 (P2), phone code (PS) or barring (AB)\n";
+           "  password FAC CODE        the PIN (SC), PIN2 (P2), phone code (PS) or barring (AB)\n"
+           "  sim-reset                unblock a SIM that three wrong PINs (or PIN2s) blocked\n";
 }
 
 void NetworkServices::Save(std::ostream& out) const {
@@ -475,6 +508,7 @@ void NetworkServices::Save(std::ostream& out) const {
         out << "net-lock " << kLockNames[i] << " " << (locked_[i] ? 1 : 0) << "\nnet-password "
             << kLockNames[i] << " " << codes_[i] << "\n";
     out << "net-password AB " << barringPassword_ << "\n";
+    out << "net-tries " << tries_[0] << " " << tries_[1] << "\n";
     out << "net-bearer " << bearer_[0] << " " << bearer_[1] << " " << bearer_[2] << "\n";
     out << "net-hscsd " << hscsd_[0] << " " << hscsd_[1] << " " << hscsd_[2] << " " << hscsd_[3]
         << "\n";
@@ -516,6 +550,11 @@ bool NetworkServices::Load(const std::string& name, const std::string& rest) {
         const int lock = LockIndex(facility);
         if ((lock >= 0 || facility == "AB") && AllDigits(code, 4, 8))
             (lock >= 0 ? codes_[lock] : barringPassword_) = code;
+    } else if (name == "net-tries") {
+        std::array<int, 2> values{};
+        if (words >> values[0] >> values[1] && values[0] >= 0 && values[0] <= kPinTries &&
+            values[1] >= 0 && values[1] <= kPinTries)
+            tries_ = values;
     } else if (name == "net-bearer") {
         std::array<int, 3> values{};
         if (words >> values[0] >> values[1] >> values[2]) bearer_ = values;

@@ -22,7 +22,8 @@ class NetworkServices : public CommandSet {
     void Save(std::ostream& out) const override;
     bool Load(const std::string& name, const std::string& rest) override;
     // Four networks (COSMOTE current, two more available, one forbidden), SIM PIN "1234",
-    // PIN2 "5678", security code "12345", barring password "0000", no forwarding or barring.
+    // PIN2 "5678", security code "12345", barring password "0000", no forwarding or barring,
+    // three tries left for each PIN.
     void FillDemo() override;
 
     // Network-side status: 1 available, 2 current, 3 forbidden (0 unknown).
@@ -41,6 +42,10 @@ class NetworkServices : public CommandSet {
     static constexpr int kClasses = 3;   // voice, data, fax: class bits 1, 2, 4
     static constexpr int kBarrings = 5;  // AO, OI, OX, AI, IR
     static constexpr int kLocks = 3;     // SC, P2, PS
+    static constexpr int kPinTries = 3;  // wrong PINs in a row before the SIM asks for its PUK
+
+    // Tries left for the PIN (0) and PIN2 (1); 0 is a blocked code.
+    int TriesLeft(int pin) const { return tries_[pin]; }
 
   private:
     Handled RunCops(const std::string& args, bool query, std::string& info, std::string& errorText);
@@ -49,6 +54,9 @@ class NetworkServices : public CommandSet {
     Handled RunCpwd(const std::string& args, std::string& errorText);
     int CurrentCode() const;
     std::string& PasswordFor(int lockOrBarring);
+    // Checks a PIN or PIN2 given for lock: counts a wrong one against its tries. Handled::Ok
+    // when it matches; otherwise the refusal is in errorText.
+    Handled CheckPin(int lock, const std::string& given, std::string& errorText);
 
     std::vector<Network> networks_;
     std::array<std::array<Forward, kClasses>, kReasons> forwards_{};
@@ -56,6 +64,7 @@ class NetworkServices : public CommandSet {
     std::array<bool, kLocks> locked_{};
     std::array<std::string, kLocks> codes_;  // PIN, PIN2, security code
     std::string barringPassword_;
+    std::array<int, 2> tries_{kPinTries, kPinTries};
     std::array<int, 3> bearer_{};  // +CBST speed, name, connection element
     std::array<int, 4> hscsd_{};   // +CHSN air rate, wanted channels, top channels, codings
 };

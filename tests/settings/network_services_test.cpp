@@ -167,6 +167,59 @@ TEST_F(NetworkServicesTest, SimLocksAndCodeChanges) {
     EXPECT_EQ(Send("AT+CPWD=\"XX\",\"1\",\"2\""), "\r\n+CME ERROR: 4\r\n");
 }
 
+// Three wrong PINs in a row block the code, whichever command carried them; a right one in
+// between gives the tries back. A blocked PIN answers every use with "PUK required" until the
+// network side resets the SIM.
+TEST_F(NetworkServicesTest, WrongPinsBlockTheSimUntilItIsReset) {
+    struct Case {
+        const char* wrong;   // a command with a wrong code
+        const char* right;   // the same with the right one
+        const char* query;   // what the blocked code refuses as well
+        const char* puk;     // the blocked code's answer
+        int pin;
+    };
+    const Case cases[] = {
+        {"AT+CLCK=\"SC\",1,\"9999\",7", "AT+CLCK=\"SC\",1,\"1234\",7", "AT+CLCK=\"SC\",2",
+         "\r\n+CME ERROR: 12\r\n", 0},
+        {"AT+CPWD=\"SC\",\"9999\",\"4321\",7", "AT+CPWD=\"SC\",\"1234\",\"1234\",7",
+         "AT+CLCK=\"SC\",0,\"1234\",7", "\r\n+CME ERROR: 12\r\n", 0},
+        {"AT+CLCK=\"P2\",1,\"9999\",7", "AT+CLCK=\"P2\",1,\"5678\",7",
+         "AT+CPWD=\"P2\",\"5678\",\"8765\",7", "\r\n+CME ERROR: 18\r\n", 1},
+    };
+    const std::string wrongPin = "\r\n+CME ERROR: 16\r\n";
+    for (const Case& c : cases) {
+        services_->FillDemo();
+        EXPECT_EQ(Send("AT+CLCK=\"SC\",1,\"1234\",7"), kOk) << c.wrong;  // the request on
+        EXPECT_EQ(Send(c.wrong), wrongPin) << c.wrong;
+        EXPECT_EQ(Send(c.wrong), wrongPin) << c.wrong;
+        EXPECT_EQ(Send(c.right), kOk) << c.right;  // two wrong, then right: all tries back
+        EXPECT_EQ(services_->TriesLeft(c.pin), NetworkServices::kPinTries);
+        EXPECT_EQ(Send(c.wrong), wrongPin) << c.wrong;
+        EXPECT_EQ(Send(c.wrong), wrongPin) << c.wrong;
+        EXPECT_EQ(Send(c.wrong), c.puk) << c.wrong;
+        EXPECT_EQ(services_->TriesLeft(c.pin), 0);
+        EXPECT_EQ(Send(c.right), c.puk) << c.right;
+        EXPECT_EQ(Send(c.query), c.puk) << c.query;
+        // The other PIN and the barring password are not touched.
+        EXPECT_EQ(services_->TriesLeft(1 - c.pin), NetworkServices::kPinTries);
+        EXPECT_EQ(Send("AT+CLCK=\"AO\",1,\"0000\",1"), kOk);
+
+        std::ostringstream saved;
+        services_->Save(saved);
+        EXPECT_NE(saved.str().find("net-tries"), std::string::npos);
+        EXPECT_EQ(services_->Control("sim-reset", ""), "OK");
+        EXPECT_EQ(Send(c.right), kOk) << c.right;
+        // A blocked SIM stays blocked across a restart of the card.
+        std::istringstream lines(saved.str());
+        std::string line;
+        while (std::getline(lines, line)) {
+            const size_t space = line.find(' ');
+            services_->Load(line.substr(0, space), line.substr(space + 1));
+        }
+        EXPECT_EQ(Send(c.right), c.puk) << c.right;
+    }
+}
+
 TEST_F(NetworkServicesTest, BearerAndHscsdSettings) {
     EXPECT_EQ(Send("AT+CBST=51,0,1;+CHSN=3,0,0,0"), kOk);
     EXPECT_EQ(Send("AT+CBST?;+CHSN?"), Info("\r\n+CBST: 51,0,1\r\n\r\n+CHSN: 3,0,0,0"));
