@@ -371,6 +371,12 @@ void CardEngine::Tick(Clock::time_point now) {
             Result("OK");
         }
     }
+    if (!waiting_.empty() && now >= waitingGivesUp_) waiting_.clear();
+    if (!ringsNext_.empty() && state_ == CallState::None) {
+        std::string number;
+        number.swap(ringsNext_);
+        Ring(number, now);
+    }
     if (state_ == CallState::Incoming) {
         if (now >= ringGivesUp_) {
             EndCall();
@@ -448,8 +454,22 @@ void CardEngine::Ring(const std::string& number, Clock::time_point now) {
     Tick(now);
 }
 
+bool CardEngine::RingWaiting(const std::string& number, bool present, Clock::time_point now) {
+    if (state_ != CallState::Active || !waiting_.empty() || number.empty()) return false;
+    waiting_ = number;
+    waitingGivesUp_ = now + std::chrono::milliseconds(config_.ringTimeoutMs);
+    if (!present) return true;
+    // As the caller id: a standard modem drops the '+' and lets the type say it.
+    const bool international = number[0] == '+';
+    const std::string shown = Standard() && international ? number.substr(1) : number;
+    Unsolicited("+CCWA: \"" + shown + "\"," + (international ? "145" : "129") + ",1");
+    return true;
+}
+
 void CardEngine::CallerHangUp() {
     if (state_ == CallState::Incoming) EndCall();
+    waiting_.clear();
+    ringsNext_.clear();
 }
 
 void CardEngine::RemoteAnswer() {
@@ -497,6 +517,7 @@ void CardEngine::SetOperator(int code) {
 
 void CardEngine::PowerLost() {
     EndCall();
+    ringsNext_.clear();
     commandRunning_ = discardLine_ = false;
     prompting_ = nullptr;
     promptText_.clear();
@@ -521,6 +542,9 @@ void CardEngine::SetState(CallState state) {
 }
 
 void CardEngine::EndCall() {
+    // The network puts a waiting caller through as a new call once the line is free.
+    if (!waiting_.empty()) ringsNext_.swap(waiting_);
+    waiting_.clear();
     SetState(CallState::None);
     callNumber_.clear();
     outgoing_ = false;

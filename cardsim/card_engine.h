@@ -91,6 +91,12 @@ class CardEngine {
     void RemoteAnswer();  // the far end answers our outgoing call
     void RemoteHangUp();  // the far end ends the call
     void LocalAnswer();   // answered on the card's own controls
+    // A second caller during an active call, put through only where the network has call
+    // waiting on (the call-waiting group decides): announced as "+CCWA: \"<number>\",<type>,1"
+    // when present is true. The caller gives up after the ring time-out, or rings as a new call
+    // once the active call ends. False when there is no active call or a caller waits already.
+    bool RingWaiting(const std::string& number, bool present, Clock::time_point now);
+    const std::string& WaitingNumber() const { return waiting_; }
     void SetBusy(const std::string& number) {
         busy_.insert(number);
         unanswered_.erase(number);
@@ -186,6 +192,9 @@ class CardEngine {
     Clock::time_point dialDecision_{};
     Clock::time_point nextRing_{};
     Clock::time_point ringGivesUp_{};
+    std::string waiting_;    // the caller waiting behind the active call
+    std::string ringsNext_;  // the waiting caller, ringing at the next tick once the call ended
+    Clock::time_point waitingGivesUp_{};
     Clock::time_point nextNoise_{};
     unsigned noiseCount_ = 0;
     std::set<std::string> busy_, unanswered_;

@@ -1,3 +1,4 @@
+#include "cardsim/call_waiting.h"
 #include "cardsim/command_set.h"
 #include "cardsim/message_memory.h"
 #include "cardsim/network_services.h"
@@ -10,6 +11,7 @@ std::vector<std::unique_ptr<CommandSet>> StandardCommandSets() {
     sets.push_back(std::make_unique<NetworkServices>());
     sets.push_back(std::make_unique<Phonebooks>());
     sets.push_back(std::make_unique<MessageMemory>());
+    sets.push_back(std::make_unique<CallWaiting>());
     return sets;
 }
 

@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "settings/barring_at.h"
+#include "settings/call_waiting_at.h"
 #include "settings/forwarding_at.h"
 #include "settings/network_at.h"
 #include "settings/security_at.h"
@@ -16,10 +17,10 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     const char* text = reply.data();
     const int length = static_cast<int>(reply.size());
 
-    switch (selector % 5) {
+    switch (selector % 6) {
         case 0: {
             // A short list, so that a full list stops the scan as well as the reply's end.
-            const int maxNames = 1 + selector / 5 % 8;
+            const int maxNames = 1 + selector / 6 % 8;
             std::vector<vqm::OperatorName> names(static_cast<size_t>(maxNames));
             int count = 0;
             vqm::ParseOperatorSearch(text, length, names.data(), maxNames, &count);
@@ -30,16 +31,25 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
             vqm::ParseNetworkMode(text, length);
             break;
         case 2: {
-            std::vector<char16_t> number(1 + selector / 5 % 40);
+            std::vector<char16_t> number(1 + selector / 6 % 40);
             vqm::ParseForwardReply(text, length, number.data(), number.size());
             break;
         }
         case 3:
-            vqm::ParseBarringReply(text, length, 1 << (selector / 5 % 3));
+            vqm::ParseBarringReply(text, length, 1 << (selector / 6 % 3));
             break;
-        default:
+        case 4:
             vqm::ParseLockReply(text, length);
             break;
+        default: {
+            const int waiting = vqm::ParseCallWaitingReply(text, length);
+            if (waiting < -1 || waiting > 1) __builtin_trap();
+            std::vector<char> number(1 + selector / 6 % 40);
+            const int n = vqm::ParseCallWaitingLine(text, length, number.data(), number.size());
+            if (n < 0 || static_cast<size_t>(n) >= number.size() || number[n] != '\0')
+                __builtin_trap();
+            break;
+        }
     }
     return 0;
 }
