@@ -14,6 +14,7 @@
 #include <QTreeWidget>
 #include <QVBoxLayout>
 #include <algorithm>
+#include <cstdio>
 #include <cstring>
 #include <fstream>
 #include <sstream>
@@ -496,6 +497,12 @@ ManageContactsView::Row ManageContactsView::RowOf(QTreeWidgetItem* item) const {
     return row;
 }
 
+std::vector<FileMenuEntry> ManageContactsView::FileMenuEntries() {
+    const bool simPage = IsSimPage(CurrentPage());
+    return {{u"Import vCard File...", kCmdContactImport, simPage && cardState_() == 2},
+            {u"Export vCard File...", kCmdContactExport, simPage}};
+}
+
 QMenu* ManageContactsView::PrepareMenu(int page, QPoint pos) {
     QTreeWidget* list = List(page);
     QMenu* menu = menus_[page];
@@ -738,7 +745,11 @@ void ManageContactsView::ImportVCard(int page) {
     if (path.empty()) return;
     std::ifstream in(path, std::ios::binary);
     std::ostringstream text;
-    text << in.rdbuf();
+    if (!in) {
+        Box(u"Cannot read " + Utf8ToUtf16(path) + u".");
+        return;
+    }
+    text << in.rdbuf();  // an empty file holds no cards
     const AddressBookResult cards = ParseVCards(text.str());
     if (!cards.opened) {
         Box(Utf8ToUtf16(cards.missingLibrary) + u" is missing.");
@@ -780,8 +791,15 @@ void ManageContactsView::ExportVCard(int page) {
         Box(Utf8ToUtf16(missing) + u" is missing.");
         return;
     }
-    std::ofstream out(path, std::ios::binary | std::ios::trunc);
+    // Written beside the target and renamed over it, so a failed export never leaves half a file.
+    const std::string temporary = path + ".tmp";
+    std::ofstream out(temporary, std::ios::binary | std::ios::trunc);
     out << text;
+    out.close();
+    if (!out || std::rename(temporary.c_str(), path.c_str()) != 0) {
+        std::remove(temporary.c_str());
+        Box(u"Cannot write " + Utf8ToUtf16(path) + u".");
+    }
 }
 
 void ManageContactsView::Find() {

@@ -91,6 +91,8 @@ class ManageContactsView : public View {
     QTreeWidget* List(int page) const;
     // The page whose list is shown (the inner Outlook page when Outlook is up).
     int CurrentPage() const;
+    // The vCard commands of the page in front, in the main window's File menu as well.
+    std::vector<FileMenuEntry> FileMenuEntries() override;
     void ShowPage(int page);
     // Fills a page's list from its cache file.
     void LoadPage(int page);

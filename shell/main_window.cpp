@@ -104,6 +104,15 @@ MainWindow::MainWindow(ShellContext& context, std::array<ViewFactory, kViewCount
 
 MainWindow::~MainWindow() {
     Shutdown();
+    // The views are children, which the base widget would delete only after this window's
+    // members are gone; a view joins its workers through the message layer and the card host,
+    // so the views go first, last made first.
+    for (auto record = views_.records.rbegin(); record != views_.records.rend(); ++record) {
+        delete record->window;
+        record->window = nullptr;
+    }
+    if (context_.messages == &messages_) context_.messages = nullptr;
+    if (context_.mainWindow == this) context_.mainWindow = nullptr;
 }
 
 void MainWindow::BuildMenuBar() {
@@ -117,6 +126,31 @@ void MainWindow::BuildMenuBar() {
     auto* file = new QMenu("File", this);
     offDisplay_ = file->addAction("Off Display", this, [this] { Command(kCmdOffDisplay); });
     file->addAction("Exit", this, [this] { Command(kCmdExit); });
+    // The view in front adds its own entries above the window's, for as long as the menu is open.
+    QObject::connect(file, &QMenu::aboutToShow, this, [this, file] {
+        for (QAction* action : file->actions()) {
+            if (!action->property("viewEntry").toBool()) continue;
+            file->removeAction(action);
+            action->deleteLater();
+        }
+        View* view = ViewAt(views_.current);
+        const std::vector<FileMenuEntry> entries =
+            view ? view->FileMenuEntries() : std::vector<FileMenuEntry>{};
+        QAction* before = file->actions().value(0);
+        for (const FileMenuEntry& entry : entries) {
+            auto* action = new QAction(QString::fromStdU16String(entry.text), file);
+            action->setEnabled(entry.enabled);
+            action->setProperty("viewEntry", true);
+            const int id = entry.id;
+            QObject::connect(action, &QAction::triggered, this, [this, id] { Command(id); });
+            file->insertAction(before, action);
+        }
+        if (!entries.empty()) {
+            QAction* separator = file->insertSeparator(before);
+            separator->setProperty("viewEntry", true);
+        }
+    });
+    fileMenu_ = file;
     auto* fileButton = new QToolButton(menuBar_);
     fileButton->setText("File");
     fileButton->setMenu(file);

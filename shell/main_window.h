@@ -92,6 +92,7 @@ class MainWindow : public QWidget, public MessageTarget, public ShellUi {
     // When ShowStatus last ran.
     std::chrono::steady_clock::time_point StatusShownAt() const { return statusShownAt_; }
     View* ViewAt(int index) const;
+    QMenu* FileMenu() const { return fileMenu_; }
     // Stops the card watch's timer (tests drive the watch by hand).
     void StopWatchTimer() { watchTimer_.stop(); }
 
@@ -125,6 +126,7 @@ class MainWindow : public QWidget, public MessageTarget, public ShellUi {
     ViewButtons buttons_{};
     QToolBar* menuBar_ = nullptr;
     QAction* offDisplay_ = nullptr;
+    QMenu* fileMenu_ = nullptr;
     QMenu* trayMenu_ = nullptr;
     QSystemTrayIcon* tray_ = nullptr;
     int trayIcon_ = 0;

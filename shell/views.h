@@ -21,11 +21,21 @@ void SetControlId(QWidget* control, int id);
 int ControlId(const QWidget* control);
 QWidget* FindControl(QWidget* root, int id);
 
+// An entry a view adds to the main window's File menu while it is in front; choosing it sends
+// the view the command id as a WM_COMMAND.
+struct FileMenuEntry {
+    std::u16string text;
+    int id = 0;
+    bool enabled = true;
+};
+
 // A view or page: a widget that answers window messages. Its object name is its class name.
 class View : public QWidget, public MessageTarget {
   public:
     explicit View(QWidget* parent) : QWidget(parent) {}
     long OnMessage(unsigned, long, long) override { return 0; }
+    // Asked each time the File menu opens, so the entries follow the view's state.
+    virtual std::vector<FileMenuEntry> FileMenuEntries() { return {}; }
 };
 
 struct ViewRecord {

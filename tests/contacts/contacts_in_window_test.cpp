@@ -3,7 +3,9 @@
 // the card, and a call from its number rings on the DialPad with the new name.
 #include <gtest/gtest.h>
 
+#include <QAction>
 #include <QApplication>
+#include <QMenu>
 #include <QLabel>
 #include <QLineEdit>
 #include <QTreeWidget>
@@ -11,6 +13,7 @@
 #include <functional>
 #include <memory>
 #include <thread>
+#include <vector>
 
 #include "calls/call_log.h"
 #include "calls/dial_pad.h"
@@ -88,6 +91,23 @@ TEST(ContactsInWindowTest, ANewContactsCallRingsWithItsName) {
         contacts->ShowPage(kContactsSimPage);
         contacts->Command(kCmdContactNew);
         EXPECT_EQ(contacts->List(kContactsSimPage)->topLevelItemCount(), 9);
+
+        // The File menu carries the vCard commands while Manage Contacts is in front, and only then.
+        auto fileEntries = [&window] {
+            emit window.FileMenu()->aboutToShow();
+            std::vector<std::string> texts;
+            for (QAction* action : window.FileMenu()->actions()) {
+                if (action->isSeparator()) continue;
+                texts.push_back(action->text().toStdString() + (action->isEnabled() ? "" : " (grey)"));
+            }
+            return texts;
+        };
+        EXPECT_EQ(fileEntries(), (std::vector<std::string>{"Import vCard File...",
+                                                           "Export vCard File...",
+                                                           "Off Display (grey)", "Exit"}));
+        window.Command(kCmdViewFirst + kViewCallLog);
+        EXPECT_EQ(fileEntries(), (std::vector<std::string>{"Off Display (grey)", "Exit"}));
+        window.Command(kCmdViewFirst + kViewManageContacts);
 
         ASSERT_EQ(sim.Control("ring +4930555777"), "OK");
         View* pad = window.ViewAt(kViewDialPad);

@@ -30,6 +30,7 @@
 #include "shell/dialogs.h"
 #include "shell/messages.h"
 #include "support/settings_store.h"
+#include "support/text.h"
 #include "tests/common/temp_folder.h"
 
 namespace vqm {
@@ -362,6 +363,15 @@ TEST_F(ManageContactsViewTest, VCardExportAndImport) {
     view.Command(kCmdContactImport);  // the card's book into the SIM
     EXPECT_EQ(Names(kContactsSimPage).size(), 8 + cardRows);
     EXPECT_TRUE(boxes_.empty());
+
+    // Neither a missing file nor an unwritable folder passes in silence; the SIM keeps its rows.
+    const std::string missing = temp_ / "absent.vcf", unwritable = temp_ / "no/such/out.vcf";
+    view.SetVCardPathSource([&](bool saving) { return saving ? unwritable : missing; });
+    view.Command(kCmdContactImport);
+    view.Command(kCmdContactExport);
+    EXPECT_EQ(boxes_, (std::vector<std::u16string>{Utf8ToUtf16("Cannot read " + missing + "."),
+                                                   Utf8ToUtf16("Cannot write " + unwritable + ".")}));
+    EXPECT_EQ(Names(kContactsSimPage).size(), 8 + cardRows);
 }
 
 TEST_F(ManageContactsViewTest, ScreenshotOfEachPageAndDialog) {
