@@ -147,14 +147,15 @@ int WriteModemCommand(SettingsStore& store, const ModemDriverFiles& files,
     if (!command) return EINVAL;
     SetSettingString(store, u"ATModemCmd", command);
 
-    // The driver reads its value with the carriage return that ends the line it sends.
+    // The driver's value carries the four characters "<cr>" after the command, as the driver
+    // expects to find them; it turns them into the line end itself.
     const std::string text = Utf16ToUtf8(command);
     const std::string valuePath = ModemInitValuePath(files);
     std::error_code error;
     fs::create_directories(fs::path(valuePath).parent_path(), error);
     if (error) return error.value();
     errno = 0;
-    if (!ReplaceFile(valuePath, text + "\r")) return LastError(EIO);
+    if (!ReplaceFile(valuePath, text + "<cr>")) return LastError(EIO);
 
     if (files.wvdialPath.empty()) return 0;
     std::string current;

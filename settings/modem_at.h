@@ -31,8 +31,8 @@ ModemDriverFiles DefaultModemDriverFiles();
 // The registry value file under files.registryRoot.
 std::string ModemInitValuePath(const ModemDriverFiles& files);
 
-// Stores command as "ATModemCmd", writes it followed by a carriage return as the driver's
-// value "3", and sets it as "Init3" of the wvdial section. Returns 0 on success, else the
+// Stores command as "ATModemCmd", writes it followed by the four characters "<cr>" as the
+// driver's value "3", and sets it as "Init3" of the wvdial section. Returns 0 on success, else the
 // error number of the step that failed (the setting stays written).
 int WriteModemCommand(SettingsStore& store, const ModemDriverFiles& files, const char16_t* command);
 

@@ -1,5 +1,6 @@
 #include "settings/network_at.h"
 
+#include <algorithm>
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
@@ -47,28 +48,98 @@ int NetworkAutomatic(Link& link) {
     return CommandResult(link, "AT+COPS=0\r");
 }
 
-int NetworkRegister(Link& link, const char16_t* name) {
+int NetworkRegisterListed(Link& link, const char16_t* name, int32_t fallbackCode) {
     if (!name) return -1;
     char narrow[kOperatorNameSize];
     WideToNarrowBounded(name, narrow, sizeof narrow);
-    const int32_t code = OperatorCodeByName(narrow);
+    int32_t code = OperatorCodeByName(narrow);
+    if (code == -1) code = fallbackCode > 0 ? fallbackCode : -1;
     if (code == -1) return -1;
     char command[32];
     std::snprintf(command, sizeof command, "AT+COPS=1,2,%d\r", static_cast<int>(code));
     return CommandResult(link, command);
 }
 
+int NetworkRegister(Link& link, const char16_t* name) {
+    return NetworkRegisterListed(link, name, -1);
+}
+
+namespace {
+
+// The digits of a quoted numeric operator ("20201"); -1 when it holds anything else.
+int32_t CodeOf(const char* text, int length) {
+    if (length <= 0 || length > 9) return -1;
+    int32_t code = 0;
+    for (int i = 0; i < length; ++i) {
+        if (text[i] < '0' || text[i] > '9') return -1;
+        code = code * 10 + (text[i] - '0');
+    }
+    return code;
+}
+
+// The standard layout: bracketed entries "(<stat>,\"<long>\",\"<short>\",\"<numeric>\"[,<act>])"
+// up to the first one that is not a network (the lists of supported modes and formats).
+void ParseBracketedSearch(FieldCursor cursor, OperatorName* names, int32_t* codes, int maxNames,
+                          int* found) {
+    for (;;) {
+        cursor.SkipBlanks();
+        if (*found >= maxNames || cursor.AtLineEnd() || !cursor.Literal("(")) return;
+        int32_t status = 0;
+        char longName[64], shortName[64], numeric[16];
+        int longLength = 0, shortLength = 0, numericLength = 0;
+        if (!(cursor.NextInt(&status) && cursor.Comma() &&
+              cursor.NextQuoted(longName, sizeof longName, &longLength) && cursor.Comma() &&
+              cursor.NextQuoted(shortName, sizeof shortName, &shortLength) && cursor.Comma() &&
+              cursor.NextQuoted(numeric, sizeof numeric, &numericLength)))
+            return;
+        const int32_t code = CodeOf(numeric, numericLength);
+        char name[kOperatorNameSize] = "";
+        if (code < 0 || OperatorNameByCode(static_cast<uint32_t>(code), name, sizeof name) == 0) {
+            // The table does not know it: the modem's own name says more than digits.
+            const char* own = longLength > 0 ? longName : shortLength > 0 ? shortName : numeric;
+            const size_t n = std::min(std::strlen(own), sizeof name - 1);
+            std::memcpy(name, own, n);
+            name[n] = '\0';
+        }
+        NarrowToWide(name, names[*found], static_cast<int>(std::strlen(name)), kOperatorNameSize);
+        if (codes) codes[*found] = code;
+        ++*found;
+        // Whatever else the entry carries (the access technology) up to its bracket and the
+        // comma before the next one.
+        const char* p = cursor.Position();
+        while (p < cursor.End() && *p != ')' && *p != '\r' && *p != '\n')
+            ++p;
+        if (p == cursor.End() || *p != ')') return;
+        cursor = FieldCursor(p + 1, cursor.End());
+        cursor.Comma();
+    }
+}
+
+}  // namespace
+
 int ParseOperatorSearch(const char* reply, int length, OperatorName* names, int maxNames,
-                        int* count) {
+                        int* count, int32_t* codes) {
     if (!reply || length <= 0) return -1;
     const int at = FindPattern(0, kCopsTag, kCopsTagLength, reply, length);
     if (at < 0) return -1;
     if (count) *count = 0;
     const char* end = reply + length;
+    if (!names || maxNames <= 0) return 1;
+
+    FieldCursor bracketed(reply + at + kCopsTagLength, end);
+    bracketed.SkipBlanks();
+    if (bracketed.Literal("(")) {
+        int found = 0;
+        ParseBracketedSearch(FieldCursor(reply + at + kCopsTagLength, end), names, codes,
+                             maxNames, &found);
+        if (count) *count = found;
+        return 1;
+    }
+
     // The name of the last entry found: an unknown code takes it over.
     char work[kOperatorNameSize] = "";
     int found = 0;
-    for (int pos = at + 7; pos < length && found < maxNames && names; pos += 10) {
+    for (int pos = at + 7; pos < length && found < maxNames; pos += 10) {
         // Each entry stands at a fixed stride from the tag, as the card lays its list out.
         FieldCursor entry(reply + pos, end);
         int32_t status = 0, code = 0;
@@ -78,18 +149,24 @@ int ParseOperatorSearch(const char* reply, int length, OperatorName* names, int 
             if (work[0] == '\0') std::snprintf(work, sizeof work, "%d", static_cast<int>(code));
         }
         NarrowToWide(work, names[found], static_cast<int>(std::strlen(work)), kOperatorNameSize);
+        if (codes) codes[found] = code;
         ++found;
         if (count) *count = found;
     }
     return 1;
 }
 
-int NetworkSearch(Link& link, OperatorName* names, int maxNames, int* count) {
+int NetworkSearchCodes(Link& link, OperatorName* names, int32_t* codes, int maxNames,
+                       int* count) {
     static_assert(kSearchReplySize >= 256);
     char reply[kSearchReplySize];
     const int length = static_cast<int>(AtCommand(link, "AT+COPS=?\r", reply, sizeof reply));
     if (length == 0) return -1;
-    return ParseOperatorSearch(reply, length, names, maxNames, count);
+    return ParseOperatorSearch(reply, length, names, maxNames, count, codes);
+}
+
+int NetworkSearch(Link& link, OperatorName* names, int maxNames, int* count) {
+    return NetworkSearchCodes(link, names, nullptr, maxNames, count);
 }
 
 }  // namespace vqm

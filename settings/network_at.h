@@ -4,6 +4,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 
 namespace vqm {
 
@@ -37,7 +38,21 @@ int NetworkSearch(Link& link, OperatorName* names, int maxNames, int* count);
 // from 7 after "+COPS:", each "<status>,,,<code>,"; the layout "+COPS: 2,,,20201,1,,,20205," is
 // what the card sends, and brackets or quotes are not looked for. A code missing from the table
 // repeats the name before it (the first such entry shows the code's digits) and still counts.
+//
+// A standard 27.007 modem answers "+COPS: (2,\"Long\",\"Short\",\"20201\"),(1,...),,(0,1,2),(2)":
+// each bracketed entry is read for its numeric code, named from the table when the code is
+// there and by the modem's own long (else short) name when not. codes, when given, gets each
+// entry's code (-1 when the reply gave none) so that a network the table cannot name can still
+// be registered.
 int ParseOperatorSearch(const char* reply, int length, OperatorName* names, int maxNames,
-                        int* count);
+                        int* count, int32_t* codes = nullptr);
+
+// As NetworkSearch, with each entry's code as ParseOperatorSearch gives it.
+int NetworkSearchCodes(Link& link, OperatorName* names, int32_t* codes, int maxNames,
+                       int* count);
+
+// As NetworkRegister; a name the table does not hold registers fallbackCode instead when it is
+// a code (a network named by the modem itself). -1 when neither gives a code.
+int NetworkRegisterListed(Link& link, const char16_t* name, int32_t fallbackCode);
 
 }  // namespace vqm

@@ -1,7 +1,13 @@
 #include "settings/settings_view.h"
 
+#include <QApplication>
+#include <QMetaObject>
 #include <QTabBar>
 
+#include "settings/centre_page.h"
+#include "settings/general_page.h"
+#include "settings/modem_page.h"
+#include "settings/network_page.h"
 #include "shell/messages.h"
 
 namespace vqm {
@@ -27,19 +33,44 @@ struct PageInfo {
 
 // ---- The settings pages, in tab order. A page's builder swaps Empty for Make<ItsPage>. ----
 const PageInfo kPages[kSettingsPageCount] = {
-    {u"General", "SETTINGS_GENERAL_PAGE", Empty},
-    {u"Messages", "SETTINGS_MESSAGES_PAGE", Empty},
-    {u"Network", "SETTINGS_NETWORK_PAGE", Empty},
+    {u"General", "SETTINGS_GENERAL_PAGE", Make<GeneralPage>},
+    {u"Messages", "SETTINGS_MESSAGES_PAGE", Make<CentrePage>},
+    {u"Network", "SETTINGS_NETWORK_PAGE", Make<NetworkPage>},
     {u"Call Forward", "SETTINGS_CALLFORWARD_PAGE", Empty},
     {u"Call Barring", "SETTINGS_CALLBARRING_PAGE", Empty},
     {u"Security", "SETTINGS_SECURITY_PAGE", Empty},
-    {u"Modem", "SETTINGS_MODEM_PAGE", Empty},
+    {u"Modem", "SETTINGS_MODEM_PAGE", Make<ModemPage>},
     {u"Call Waiting", "SETTINGS_CALLWAITING_PAGE", Empty},
     {u"Tones", "SETTINGS_TONES_PAGE", Empty},
 };
 // ---- end of the pages ----
 
 }  // namespace
+
+CardExchange::~CardExchange() {
+    worker_.Stop();
+    worker_.Join();
+    if (busy_) QApplication::restoreOverrideCursor();
+}
+
+bool CardExchange::Run(std::function<int()> work, std::function<void(int result)> done) {
+    if (busy_) return false;
+    busy_ = true;
+    QApplication::setOverrideCursor(Qt::WaitCursor);
+    worker_.Post([this, work = std::move(work), done = std::move(done)] {
+        const int result = work();
+        // Queued to the owner: dropped by Qt if the page is gone by then.
+        QMetaObject::invokeMethod(
+            owner_,
+            [this, result, done] {
+                busy_ = false;
+                QApplication::restoreOverrideCursor();
+                done(result);
+            },
+            Qt::QueuedConnection);
+    });
+    return true;
+}
 
 SettingsView::SettingsView(QWidget* parent, ShellContext& context)
     : View(parent), context_(context) {
@@ -87,6 +118,7 @@ void SettingsView::FollowCardState() {
     setEnabled(cardState_() == 2);
 }
 
+// Pages hear of the card state with the state itself in wParam.
 long SettingsView::OnMessage(unsigned msg, long wParam, long lParam) {
     if (msg == kMsgCardStateChanged) FollowCardState();
     // The view coming forward shows its current page again; the card's news is for every page.
@@ -96,7 +128,7 @@ long SettingsView::OnMessage(unsigned msg, long wParam, long lParam) {
     }
     if (msg == kMsgCardStateChanged) {
         for (ViewRecord& record : pages_.records)
-            if (record.window) record.window->OnMessage(msg, wParam, lParam);
+            if (record.window) record.window->OnMessage(msg, cardState_(), lParam);
     }
     return 0;
 }

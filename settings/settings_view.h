@@ -5,6 +5,7 @@
 
 #include <functional>
 
+#include "calls/card_worker.h"
 #include "shell/main_window.h"
 #include "shell/views.h"
 
@@ -16,6 +17,26 @@ inline constexpr int kSettingsPageCount = 9;
 inline constexpr int kSettingsGeneral = 0, kSettingsMessages = 1, kSettingsNetwork = 2,
                      kSettingsCallForward = 3, kSettingsCallBarring = 4, kSettingsSecurity = 5,
                      kSettingsModem = 6, kSettingsCallWaiting = 7, kSettingsTones = 8;
+
+// A page's exchanges with the card: each runs on the page's own worker with the wait cursor
+// shown, and its result comes back to done on the window's thread, so the window keeps
+// painting while the card answers. One at a time: Run refuses while one is under way.
+class CardExchange {
+  public:
+    explicit CardExchange(QObject* owner) : owner_(owner) {}
+    // Waits for the exchange under way (the link bounds it); its result is dropped.
+    ~CardExchange();
+    CardExchange(const CardExchange&) = delete;
+    CardExchange& operator=(const CardExchange&) = delete;
+
+    bool Busy() const { return busy_; }
+    bool Run(std::function<int()> work, std::function<void(int result)> done);
+
+  private:
+    QObject* owner_;
+    bool busy_ = false;
+    CardWorker worker_;
+};
 
 class SettingsView : public View {
   public:

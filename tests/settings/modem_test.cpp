@@ -57,14 +57,14 @@ TEST_F(ModemCommandTest, IsdnV120At19200GoesToTheSettingTheDriverAndWvdial) {
     const std::string valuePath = ModemInitValuePath(files_);
     EXPECT_EQ(valuePath, files_.registryRoot +
                              "/Drivers/PCMCIA/Tavro_Mobile_Phones-TAVRO_CARD_PHONE-4C2D/Init/3");
-    EXPECT_EQ(ReadAll(valuePath), "AT+CBST=51,0,1;+CHSN=3,0,0,0\r");
+    EXPECT_EQ(ReadAll(valuePath), "AT+CBST=51,0,1;+CHSN=3,0,0,0<cr>");
     EXPECT_EQ(ReadAll(files_.wvdialPath),
               "[Dialer Defaults]\nModem = /dev/ttyUSB0\nInit3 = ATZ\n\n[Dialer other]\nPhone = 1\n"
               "\n[Dialer VQMFull]\nInit3 = AT+CBST=51,0,1;+CHSN=3,0,0,0\n");
 
     // A second choice replaces both values; the rest of the wvdial file stays as it was.
     EXPECT_EQ(WriteModemCommand(store_, files_, ModemCommand(1, 0)), 0);
-    EXPECT_EQ(ReadAll(valuePath), "AT+CBST=71,0,1;+CHSN=1,0,0,0\r");
+    EXPECT_EQ(ReadAll(valuePath), "AT+CBST=71,0,1;+CHSN=1,0,0,0<cr>");
     EXPECT_EQ(ReadAll(files_.wvdialPath),
               "[Dialer Defaults]\nModem = /dev/ttyUSB0\nInit3 = ATZ\n\n[Dialer other]\nPhone = 1\n"
               "\n[Dialer VQMFull]\nInit3 = AT+CBST=71,0,1;+CHSN=1,0,0,0\n");
@@ -102,7 +102,7 @@ TEST_F(ModemCommandTest, WithoutAWvdialFileOneIsMadeAndWithoutAPathNoneIs) {
     files_.wvdialPath.clear();
     EXPECT_EQ(WriteModemCommand(store_, files_, ModemCommand(0, 2)), 0);
     EXPECT_FALSE(fs::exists(temp_ / "wvdialrc"));
-    EXPECT_EQ(ReadAll(ModemInitValuePath(files_)), "AT+CBST=0,0,1;+CHSN=3,0,0,0\r");
+    EXPECT_EQ(ReadAll(ModemInitValuePath(files_)), "AT+CBST=0,0,1;+CHSN=3,0,0,0<cr>");
 }
 
 TEST(WvdialInit3, ReplacesOrAddsOnlyItsOwnLine) {

@@ -41,12 +41,8 @@ TEST(OperatorSearchScan, ReadsEntriesOfTheCardsLayoutInReplyOrder) {
     EXPECT_EQ(s.names[1], u"PANAFON");  // forbidden, listed all the same
     EXPECT_EQ(s.names[2], u"untouched");
 
-    // An empty list and a list in the bracketed layout both find nothing but still succeed.
+    // An empty list finds nothing but still succeeds.
     s = ScanSearch("\r\n+COPS: \r\n\r\nOK\r\n");
-    EXPECT_EQ(s.result, 1);
-    EXPECT_EQ(s.count, 0);
-    s = ScanSearch(
-        "+COPS: (2,\"COSMOTE\",\"COSMOTE\",\"20201\"),(1,\"P\",\"P\",\"20205\")\r\nOK\r\n");
     EXPECT_EQ(s.result, 1);
     EXPECT_EQ(s.count, 0);
 }
@@ -100,6 +96,76 @@ TEST(OperatorSearchScan, StaysInsideTheReplyAndTheList) {
     Search s = ScanSearch(reply, 2);
     EXPECT_EQ(s.count, 2);
     EXPECT_EQ(s.names[2], u"untouched");
+}
+
+// A standard modem's bracketed list: names from the table by code, the modem's own names for
+// codes the table lacks, each entry's code kept for registration, and the lists of modes and
+// formats after the networks not taken for networks.
+TEST(OperatorSearchScan, ReadsTheStandardBracketedLayout) {
+    struct Case {
+        const char* reply;
+        std::vector<std::u16string> names;
+        std::vector<int32_t> codes;
+    };
+    const Case cases[] = {
+        {"\r\n+COPS: (2,\"Cosmote GR\",\"COSMOTE\",\"20201\"),(1,\"vodafone GR\",\"voda\","
+         "\"20205\",2),,(0,1,2,3,4),(0,1,2)\r\n\r\nOK\r\n",
+         {u"COSMOTE", u"PANAFON"},
+         {20201, 20205}},
+        {"+COPS: (1,\"Far Away Net\",\"FAN\",\"99901\"),(3,\"\",\"Short\",\"99902\"),"
+         "(1,\"\",\"\",\"99903\")\r\n",
+         {u"Far Away Net", u"Short", u"99903"},
+         {99901, 99902, 99903}},
+        // A code that is not digits gives no code; the modem's name still shows.
+        {"+COPS: (1,\"Odd\",\"O\",\"2O2O1\")\r\n", {u"Odd"}, {-1}},
+        // Broken entries end the list where they break.
+        {"+COPS: (2,\"Cosmote GR\",\"COSMOTE\",\"20201\"),(1,\"cut", {u"COSMOTE"}, {20201}},
+        {"+COPS: (2,\"Cosmote GR\",\"COSMOTE\",\"20201\"", {u"COSMOTE"}, {20201}},
+        {"+COPS: (2,\"A\",\"B\")", {}, {}},
+        {"+COPS: ()\r\nOK\r\n", {}, {}},
+        {"+COPS: (0,1,2,3,4),(0,1,2)\r\nOK\r\n", {}, {}},
+    };
+    for (const Case& c : cases) {
+        std::vector<OperatorName> names(8);
+        std::vector<int32_t> codes(8, -7);
+        int count = -7;
+        const std::string reply = c.reply;
+        // The reply in a buffer of its exact size, so a read past it is a read past the heap.
+        std::vector<char> exact(reply.begin(), reply.end());
+        EXPECT_EQ(ParseOperatorSearch(exact.data(), static_cast<int>(exact.size()), names.data(),
+                                      8, &count, codes.data()),
+                  1)
+            << c.reply;
+        ASSERT_EQ(count, static_cast<int>(c.names.size())) << c.reply;
+        for (int i = 0; i < count; ++i) {
+            EXPECT_EQ(std::u16string(names[i]), c.names[i]) << c.reply;
+            EXPECT_EQ(codes[i], c.codes[i]) << c.reply;
+        }
+    }
+}
+
+// A hundred networks in either layout fill a list of a hundred and stop at a shorter one.
+TEST(OperatorSearchScan, HundredNetworksInEitherLayout) {
+    std::string card = "+COPS: ", standard = "+COPS: ";
+    for (int i = 0; i < 100; ++i) {
+        const int code = i % 2 ? 20201 : 90000 + i;  // unknown codes between known ones
+        card += "1,,," + std::to_string(code) + ",";
+        standard += std::string(i ? "," : "") + "(1,\"Net" + std::to_string(i) + "\",\"N\",\"" +
+                    std::to_string(code) + "\")";
+    }
+    for (const std::string& reply : {card, standard}) {
+        for (int room : {100, 37}) {
+            std::vector<OperatorName> names(static_cast<size_t>(room));
+            std::vector<int32_t> codes(static_cast<size_t>(room));
+            int count = 0;
+            ASSERT_EQ(ParseOperatorSearch(reply.data(), static_cast<int>(reply.size()),
+                                          names.data(), room, &count, codes.data()),
+                      1);
+            ASSERT_EQ(count, room) << reply.substr(0, 40);
+            EXPECT_EQ(codes[room - 1], room % 2 == 0 ? 20201 : 90000 + room - 1);
+            EXPECT_EQ(std::u16string(names[1]), u"COSMOTE");
+        }
+    }
 }
 
 TEST(NetworkModeScan, ReadsTheSelectionMode) {
