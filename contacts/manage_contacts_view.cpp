@@ -106,11 +106,14 @@ ContactDialog::ContactDialog(QWidget* parent, const QString& title, const QStrin
     auto* form = new QFormLayout();
     if (copy) {
         auto* why = new QLabel(reason, this);
+        why->setTextFormat(Qt::PlainText);
         why->setWordWrap(true);
         SetControlId(why, kContactReasonId);
         layout->addWidget(why);
         auto* name = new QLabel(oldName, this);
         auto* number = new QLabel(oldNumber, this);
+        name->setTextFormat(Qt::PlainText);  // names and numbers come from the card
+        number->setTextFormat(Qt::PlainText);
         SetControlId(name, kContactOldNameId);
         SetControlId(number, kContactOldNumberId);
         form->addRow("Name:", name);

@@ -53,6 +53,8 @@ int Dialogs::MessageBox(QWidget* parent, const std::u16string& text, const std::
     const DialogRequest request{text, title, style, false, nullptr};
     if (const auto answer = Answer(request)) return *answer;
     QMessageBox box(parent);
+    // Texts may carry names, numbers and messages from outside: never read as markup.
+    box.setTextFormat(Qt::PlainText);
     box.setText(QString::fromStdU16String(text));
     box.setWindowTitle(QString::fromStdU16String(title));
     switch (style & kIconMask) {

@@ -16,6 +16,23 @@ const QString kInterface = QStringLiteral("org.freedesktop.Notifications");
 const QString kAction = QStringLiteral("default");
 }  // namespace
 
+QString NotificationBody(const QString& text, bool serviceReadsMarkup) {
+    if (!serviceReadsMarkup) return text;
+    QString escaped;
+    escaped.reserve(text.size());
+    for (QChar c : text) {
+        if (c == u'&')
+            escaped += QStringLiteral("&amp;");
+        else if (c == u'<')
+            escaped += QStringLiteral("&lt;");
+        else if (c == u'>')
+            escaped += QStringLiteral("&gt;");
+        else
+            escaped += c;
+    }
+    return escaped;
+}
+
 Notifier::Notifier(std::function<void(int)> onAction, QObject* parent)
     : QObject(parent), onAction_(std::move(onAction)) {
     QDBusConnection bus = QDBusConnection::sessionBus();
@@ -28,6 +45,16 @@ Notifier::Notifier(std::function<void(int)> onAction, QObject* parent)
 }
 
 void Notifier::Post(int id, const QString& body, const QString& soundFile) {
+    if (available_ && readsMarkup_ < 0) {
+        QDBusReply<QStringList> capabilities = QDBusConnection::sessionBus().call(
+            QDBusMessage::createMethodCall(kService, kPath, kInterface,
+                                           QStringLiteral("GetCapabilities")),
+            QDBus::Block, 2000);
+        // A service that does not answer is asked again next time; meanwhile escaping is the
+        // safe guess, as most services read markup.
+        if (capabilities.isValid())
+            readsMarkup_ = capabilities.value().contains(QStringLiteral("body-markup")) ? 1 : 0;
+    }
     if (available_) {
         QDBusMessage call =
             QDBusMessage::createMethodCall(kService, kPath, kInterface, QStringLiteral("Notify"));
@@ -35,7 +62,8 @@ void Notifier::Post(int id, const QString& body, const QString& soundFile) {
         if (!soundFile.isEmpty()) hints[QStringLiteral("sound-file")] = soundFile;
         const auto known = serverIds_.find(id);
         call << QStringLiteral("VQM Dialer") << (known == serverIds_.end() ? 0u : known->second)
-             << QString() << QStringLiteral("VQM Dialer") << body
+             << QString() << QStringLiteral("VQM Dialer")
+             << NotificationBody(body, readsMarkup_ != 0)
              << QStringList{kAction, QStringLiteral("Open DialPad")} << hints << int(-1);
         QDBusReply<uint> reply = QDBusConnection::sessionBus().call(call, QDBus::Block, 2000);
         if (reply.isValid()) {

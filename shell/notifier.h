@@ -11,12 +11,17 @@
 
 namespace vqm {
 
+// The body as a notification service shows it: one that reads body markup gets &, < and >
+// escaped, so that a sender's "<b>" shows as typed; one that does not gets the text as it is.
+QString NotificationBody(const QString& text, bool serviceReadsMarkup);
+
 class Notifier : public QObject {
     Q_OBJECT
   public:
     explicit Notifier(std::function<void(int id)> onAction, QObject* parent = nullptr);
 
-    // Posts or replaces the notification with this id. soundFile may be empty.
+    // Posts or replaces the notification with this id. body is plain text; soundFile may be
+    // empty.
     void Post(int id, const QString& body, const QString& soundFile = {});
     void Remove(int id);
     bool Available() const { return available_; }
@@ -29,6 +34,7 @@ class Notifier : public QObject {
     std::function<void(int)> onAction_;
     std::map<int, uint> serverIds_;  // our id -> the service's id
     bool available_ = false;
+    int readsMarkup_ = -1;  // the service's "body-markup" capability; -1 not asked yet
     bool warned_ = false;
 };
 

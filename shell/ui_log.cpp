@@ -26,10 +26,19 @@ void UiLog::Line(std::string_view what, std::u16string_view text) {
     if (!text.empty()) {
         line += ' ';
         for (char c : Utf16ToUtf8(std::u16string(text))) {
-            if (c == '\n')
+            const auto byte = static_cast<unsigned char>(c);
+            if (c == '\n') {
                 line += " / ";
-            else if (c != '\r')
+            } else if (c == '\r') {  // dropped: "\r\n" is one break
+            } else if (byte < 0x20 || byte == 0x7F) {
+                // A caller id or message with terminal escapes must not rewrite the screen
+                // of whoever reads the log.
+                char escaped[8];
+                std::snprintf(escaped, sizeof escaped, "\\x%02x", byte);
+                line += escaped;
+            } else {
                 line += c;
+            }
         }
     }
     line += '\n';

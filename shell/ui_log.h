@@ -21,7 +21,8 @@ class UiLog {
     UiLog& operator=(const UiLog&) = delete;
 
     bool Enabled() const { return file_ != nullptr; }
-    // "<seconds> <what> <text>": line breaks in text become " / " so one event stays one line.
+    // "<seconds> <what> <text>", text as plain characters: line breaks become " / " so one
+    // event stays one line, other control characters show as "\xNN".
     void Line(std::string_view what, std::u16string_view text = {});
 
   private:

@@ -16,6 +16,7 @@
 #include "support/local_socket.h"
 #include "support/settings_store.h"
 #include "tests/common/temp_folder.h"
+#include "tests/shell/fake_card_host.h"
 
 namespace vqm {
 namespace {
@@ -35,19 +36,7 @@ class RecordingView : public View {
     std::vector<std::pair<int, unsigned>>& log_;
 };
 
-class FakeCard : public CardHost {
-  public:
-    bool CompanionExists() override { return true; }
-    std::optional<long> SendCompanion(unsigned msg) override {
-        return msg == kMsgCardPowerQuery ? answer : 1;
-    }
-    int OpenLink() override { return 1; }
-    void CloseLink() override {}
-    int CardPresent() override { return present; }
-    void Sleep(int) override {}
-    long answer = 0;
-    int present = 1;
-};
+using FakeCard = testing::FakeCardHost;
 
 class MainWindowTest : public ::testing::Test {
   protected:

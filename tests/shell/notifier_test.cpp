@@ -41,6 +41,11 @@ class FakeNotificationService : public QObject {
         posted.push_back({app, summary, body, actions, replaces});
         return replaces ? replaces : ++lastId;
     }
+    QStringList GetCapabilities() {
+        std::lock_guard<std::mutex> lock(mutex);
+        ++capabilityQueries;
+        return capabilities;
+    }
     void CloseNotification(uint id) {
         std::lock_guard<std::mutex> lock(mutex);
         closed.push_back(id);
@@ -51,6 +56,8 @@ class FakeNotificationService : public QObject {
     std::vector<Posted> posted;
     std::vector<uint> closed;
     uint lastId = 40;
+    QStringList capabilities{"actions", "body", "body-markup"};
+    int capabilityQueries = 0;
 };
 
 class NotifierTest : public ::testing::Test {
@@ -137,6 +144,39 @@ TEST_F(NotifierTest, PostsTitledAlertsWhoseActionBringsTheDialPadAndRemovesThemB
     notifier.Remove(2002);  // already gone: nothing more is sent
     Pump([] { return false; }, std::chrono::milliseconds(300));
     EXPECT_EQ(Closed().size(), 1u);
+}
+
+// Message bodies, sender numbers and names reach the body: a service that reads markup must
+// show them as typed, never as bold text or an image of a local file.
+TEST_F(NotifierTest, BodyIsEscapedExactlyWhenTheServiceReadsMarkup) {
+    const QString hostile = R"(You have 1 new SMS from <b>x</b><img src="file:///etc/passwd"> &lt;.)";
+    const QString escaped =
+        R"(You have 1 new SMS from &lt;b&gt;x&lt;/b&gt;&lt;img src="file:///etc/passwd"&gt; &amp;lt;.)";
+    const struct {
+        QStringList capabilities;
+        QString body;
+    } cases[] = {
+        {{"actions", "body", "body-markup"}, escaped},
+        {{"actions", "body"}, hostile},
+    };
+    for (const auto& c : cases) {
+        SCOPED_TRACE(c.capabilities.join(",").toStdString());
+        {
+            std::lock_guard<std::mutex> lock(service_.mutex);
+            service_.capabilities = c.capabilities;
+            service_.posted.clear();
+            service_.capabilityQueries = 0;
+        }
+        Notifier notifier([](int) {});
+        notifier.Post(2002, hostile);
+        notifier.Post(2002, hostile);
+        ASSERT_EQ(Posted().size(), 2u);
+        EXPECT_EQ(Posted()[0].body, c.body);
+        EXPECT_EQ(Posted()[1].body, c.body);
+        std::lock_guard<std::mutex> lock(service_.mutex);
+        EXPECT_EQ(service_.capabilityQueries, 1);  // asked once, not for every alert
+    }
+    EXPECT_EQ(NotificationBody("a & b < c > d", true), "a &amp; b &lt; c &gt; d");
 }
 
 }  // namespace
