@@ -21,7 +21,6 @@
 #include <vector>
 
 #include "contacts/phonebook_at.h"
-#include "contacts/recipients.h"
 #include "link/link.h"
 #include "shell/dialogs.h"
 #include "shell/messages.h"
@@ -826,15 +825,6 @@ void ManageContactsView::Find() {
     list->setCurrentItem(item);
     item->setSelected(true);
     list->scrollToItem(item);
-}
-
-int HandRecipientsToWriteSms(ShellContext& context, const std::u16string& recipients) {
-    if (!context.mainWindow) return 0;
-    auto* receiver = dynamic_cast<RecipientsReceiver*>(context.mainWindow->ViewAt(kViewWriteSms));
-    if (!receiver) return 0;
-    receiver->AppendRecipients(recipients);
-    context.mainWindow->Command(kCmdViewFirst + kViewWriteSms);
-    return 1;
 }
 
 }  // namespace vqm

@@ -76,7 +76,7 @@ class ContactDialog : public QDialog {
 class ManageContactsView : public View {
   public:
     using DialFunction = std::function<int(const std::u16string& number)>;
-    // Hands "name<number>;\r\n" to the Write SMS view.
+    // Hands "name<number>;\r\n" to the Write SMS view (HandToWriteSms in the program).
     using WriteMessageFunction = std::function<void(const std::u16string& recipients)>;
 
     // caches are the program's shared ones when given; otherwise the view keeps its own.
@@ -164,9 +164,5 @@ class ManageContactsView : public View {
     std::mutex boxMutex_;
     std::u16string boxText_;
 };
-
-// Hands recipients to the Write SMS view of the program and brings it forward: the view there
-// takes them when it implements RecipientsReceiver (contacts/recipients.h). 0 when it does not.
-int HandRecipientsToWriteSms(ShellContext& context, const std::u16string& recipients);
 
 }  // namespace vqm

@@ -11,6 +11,7 @@
 #include <algorithm>
 #include <cstdio>
 
+#include "contacts/manage_contacts.h"
 #include "link/link.h"
 #include "shell/card_watch.h"
 #include "shell/dialogs.h"
@@ -349,15 +350,13 @@ void SmsFolderView::Reply() {
     char16_t number[32];
     NarrowToWide(row->record.number, number,
                  static_cast<int>(strnlen(row->record.number, sizeof row->record.number)), 32);
-    handoff_.Hand({RecipientText(NameOf(row->record.number), number), {}});
-    if (hooks_.showWriteView) hooks_.showWriteView();
+    if (hooks_.write) hooks_.write(ReplyRequest(RecipientText(NameOf(row->record.number), number)));
 }
 
 void SmsFolderView::Forward() {
     const FolderRow* row = CurrentRow(pages_.current);
     if (!row) return;
-    handoff_.Hand({{}, row->body});
-    if (hooks_.showWriteView) hooks_.showWriteView();
+    if (hooks_.write) hooks_.write(ForwardRequest(row->body));
 }
 
 void SmsFolderView::DeleteSelected() {

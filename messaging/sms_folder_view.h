@@ -43,8 +43,8 @@ struct FolderViewHooks {
     std::function<void(int full)> simFullAlert;
     // Listing took messages out of "NewIdx"; the DialPad's notice may go.
     std::function<void()> newMessagesTaken;
-    // Bring the Write SMS view up; Reply and Forward have handed it their request.
-    std::function<void()> showWriteView;
+    // Reply and Forward: the request goes to the Write SMS view, which comes up.
+    std::function<void(WriteRequest request)> write;
 };
 
 class SmsFolderView : public View {
@@ -74,7 +74,6 @@ class SmsFolderView : public View {
     const std::vector<FolderRow>& Rows(int page) const { return listing_.pages[page]; }
     int RefreshState() const { return refreshState_; }
     MessageStore& Store() { return store_; }
-    WriteHandoff& Handoff() { return handoff_; }
     ViewSet& Pages() { return pages_; }
     // Where the card state comes from; the main window's by default.
     void SetCardStateSource(std::function<int()> source) { cardState_ = std::move(source); }
@@ -103,7 +102,6 @@ class SmsFolderView : public View {
     PhonebookCaches* caches_;
     FolderViewHooks hooks_;
     MessageStore store_;
-    WriteHandoff handoff_;
     ViewSet pages_;
     FolderListing listing_;
     std::array<QTreeWidget*, kPageCount> lists_{};

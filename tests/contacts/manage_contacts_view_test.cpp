@@ -24,7 +24,6 @@
 
 #include "cardsim/card_sim.h"
 #include "contacts/phonebook_at.h"
-#include "contacts/recipients.h"
 #include "link/link.h"
 #include "shell/card_watch.h"
 #include "shell/dialogs.h"
@@ -404,47 +403,6 @@ TEST_F(ManageContactsViewTest, ScreenshotOfEachPageAndDialog) {
     copy.Name()->setText("Alice Smith-J");
     copy.resize(240, 260);
     EXPECT_TRUE(copy.grab().save(QString(kShotFolder) + "/copy-dialog.png"));
-}
-
-// In the program, Write Message's text goes to the Write SMS view, which comes forward.
-class RecipientsView : public View, public RecipientsReceiver {
-  public:
-    explicit RecipientsView(QWidget* parent) : View(parent) {}
-    void AppendRecipients(const std::u16string& text) override { received += text; }
-    std::u16string received;
-};
-
-class ReadyCard : public CardHost {
-  public:
-    bool CompanionExists() override { return true; }
-    std::optional<long> SendCompanion(unsigned) override { return 1; }
-    int OpenLink() override { return 1; }
-    void CloseLink() override {}
-    int CardPresent() override { return 1; }
-    void Sleep(int) override {}
-};
-
-TEST(HandRecipientsTest, TheWriteSmsViewTakesTheTextAndComesForward) {
-    const testing::TempFolder temp;
-    SettingsStore settings(temp / "settings.db");
-    Link link(settings, DriverRoots{temp / "run", temp / "tty"});
-    Dialogs dialogs;
-    ShellContext context{settings, link, dialogs, temp / "run"};
-    EXPECT_EQ(HandRecipientsToWriteSms(context, u"A<1>;\r\n"), 0);  // no window yet
-    std::array<ViewFactory, kViewCount> factories;
-    for (int i = 0; i < kViewCount; ++i)
-        factories[i] = [](QWidget* parent, ShellContext&) -> View* { return new View(parent); };
-    factories[kViewWriteSms] = [](QWidget* parent, ShellContext&) -> View* {
-        return new RecipientsView(parent);
-    };
-    ReadyCard card;
-    MainWindow window(context, factories, &card);
-    window.StopWatchTimer();
-    EXPECT_EQ(HandRecipientsToWriteSms(context, u"Bob Jones<+447700900456>;\r\n"), 1);
-    auto* write = dynamic_cast<RecipientsView*>(window.ViewAt(kViewWriteSms));
-    ASSERT_NE(write, nullptr);
-    EXPECT_EQ(write->received, u"Bob Jones<+447700900456>;\r\n");
-    EXPECT_EQ(window.Views().current, kViewWriteSms);
 }
 
 }  // namespace

@@ -20,6 +20,7 @@
 #include "calls/dial_pad_view.h"
 #include "cardsim/card_sim.h"
 #include "link/link.h"
+#include "messaging/write_sms_view.h"
 #include "shell/dialogs.h"
 #include "shell/messages.h"
 #include "shell/view_factories.h"
@@ -389,19 +390,17 @@ TEST_F(SmsFolderViewTest, ReplyAndForwardHandTheirTextToTheWriteViewAndSendFiles
     Select(kPageInbox, 2);
     Click(kFolderReplyFirstId + kPageInbox);
     EXPECT_EQ(window_->Views().current, kViewWriteSms);
-    std::optional<WriteRequest> request = folder_->Handoff().Take();
-    ASSERT_TRUE(request.has_value());
-    EXPECT_EQ(request->recipients, u"Alice<+447700900123>;\r\n");
-    EXPECT_EQ(request->text, u"");
-    EXPECT_FALSE(folder_->Handoff().Take().has_value());  // taken once
+    auto* write = dynamic_cast<WriteSmsView*>(window_->ViewAt(kViewWriteSms));
+    ASSERT_NE(write, nullptr);
+    EXPECT_EQ(write->Recipients(), u"Alice<+447700900123>;\n");  // the box's line break
+    EXPECT_EQ(write->Text(), u"");
 
     window_->Command(kCmdViewFirst + kViewSmsFolder);
     Select(kPageInbox, 0);
     Click(kFolderForwardFirstId + kPageInbox);
-    request = folder_->Handoff().Take();
-    ASSERT_TRUE(request.has_value());
-    EXPECT_EQ(request->recipients, u"");
-    EXPECT_EQ(request->text, u"Καλημέρα! Τα λέμε αύριο;");
+    EXPECT_EQ(window_->Views().current, kViewWriteSms);
+    EXPECT_EQ(write->Recipients(), u"");  // a new message
+    EXPECT_EQ(write->Text(), u"Καλημέρα! Τα λέμε αύριο;");
 
     // The Outbox's stored message goes out and its copy is kept as sent, on the handheld.
     window_->Command(kCmdViewFirst + kViewSmsFolder);
