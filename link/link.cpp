@@ -233,10 +233,16 @@ unsigned AtExchange(Link& link, const char* command, char* reply, size_t replySi
             if (r == ReadResult::Byte) {
                 framer.Feed(byte);
                 silentMs = 0;
-                // Nothing after the final result is the reply's: a ring that follows it is
-                // handed on now rather than after the card falls silent.
-                if (framer.Complete() && framer.UnsolicitedAfterResult()) break;
-                continue;
+                // A ring that came inside the reply or after it is handed on as soon as the
+                // final result is in, rather than after the card falls silent: nothing of the
+                // reply follows its final result.
+                if (!framer.Complete() || !framer.EventsWaiting()) continue;
+                // The result line's "\n" still belongs to the reply.
+                if (byte == '\r' && ReadByte(fd, &byte, kInterByteMs) == ReadResult::Byte) {
+                    framer.Feed(byte);
+                    if (byte != '\n') continue;
+                }
+                break;
             }
             if (framer.Complete()) break;
             silentMs += kReadTimeoutMs;

@@ -164,7 +164,6 @@ bool ReplyFramer::LineEnded() {
         return true;
     }
     unsolicited_.push_back(line_);
-    if (complete_) lateUnsolicited_ = true;
     // Take the line out of the reply with the line ends that led to it, keeping the
     // terminator of the reply line before it, so the reply reads as if it had not come.
     unsigned cut = lineStart_;

@@ -41,8 +41,9 @@ class ReplyFramer {
     // Echo bytes still expected (none once the reply has begun).
     bool EchoPending() const { return !echoOff_ && echoPos_ < echo_.size(); }
 
-    // An unsolicited line came after the final result, and no line is half read.
-    bool UnsolicitedAfterResult() const { return lateUnsolicited_ && !inLine_; }
+    // An unsolicited line is waiting to be taken, and no line is half read: once the reply is
+    // complete too, the exchange ends without waiting for the card to fall silent.
+    bool EventsWaiting() const { return !unsolicited_.empty() && !inLine_; }
     // Unsolicited lines completed so far, each without its line end, in arrival order.
     std::vector<std::string> TakeUnsolicited();
     // A line still being received when the exchange ended, to be resumed by the next read.
@@ -72,7 +73,6 @@ class ReplyFramer {
     std::string line_;  // the current line's first bytes, for classifying it
     bool complete_ = false;
     bool heard_ = false;
-    bool lateUnsolicited_ = false;
     std::vector<std::string> unsolicited_;
 };
 

@@ -115,6 +115,25 @@ TEST(ReplyFramer, SilenceBeforeTheFinalResultIsNotTheEnd) {
     EXPECT_FALSE(Frame("AT+CLCC\r", "AT+CLCC\r\r\n\x93\x11OK\xff\r\n").complete);
 }
 
+// A ring inside a reply is handed on once the final result is in, but never while a line is
+// half read; once taken, nothing waits.
+TEST(ReplyFramer, EventsWaitOnlyForWholeLines) {
+    std::vector<char> reply(256);
+    ReplyFramer framer("AT+CLCC\r", reply.data(), reply.size());
+    auto feed = [&framer](const std::string& bytes) { framer.Feed(bytes.data(), bytes.size()); };
+    feed("AT+CLCC\r\r\n+CRI");
+    EXPECT_FALSE(framer.EventsWaiting());
+    feed("NG: VOICE\r\n");
+    EXPECT_TRUE(framer.EventsWaiting());
+    feed("\r\nO");
+    EXPECT_FALSE(framer.EventsWaiting() || framer.Complete());
+    feed("K\r\n");
+    EXPECT_TRUE(framer.Complete() && framer.EventsWaiting());
+    EXPECT_EQ(framer.TakeUnsolicited(), std::vector<std::string>{"+CRING: VOICE"});
+    EXPECT_FALSE(framer.EventsWaiting());
+    EXPECT_EQ(std::string(reply.data()), "\r\nOK\r\n");
+}
+
 TEST(ReplyFramer, ALineCutByTheEndOfAReadIsFinishedByTheNext) {
     ReplyFramer first(nullptr, nullptr, 0);
     first.Feed("\r\n+CRI", 6);
