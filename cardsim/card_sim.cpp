@@ -44,12 +44,18 @@ CardSim::~CardSim() {
     PowerDown();
 }
 
+bool CardSim::Powered() const {
+    std::lock_guard<std::mutex> lock(mutex_);
+    return master_ >= 0;
+}
+
 std::string CardSim::DevicePath() const {
     std::lock_guard<std::mutex> lock(mutex_);
     return slavePath_;
 }
 
 bool CardSim::PowerUp() {
+    std::lock_guard<std::mutex> power(powerMutex_);
     if (Powered()) return true;
     if (!inserted_) return false;
     int master = posix_openpt(O_RDWR | O_NOCTTY | O_CLOEXEC);
@@ -69,6 +75,7 @@ bool CardSim::PowerUp() {
 }
 
 void CardSim::PowerDown() {
+    std::lock_guard<std::mutex> power(powerMutex_);
     Unregister();
     stop_ = true;
     if (worker_.joinable()) worker_.join();

@@ -54,7 +54,7 @@ class CardSim {
     // Powering up fails while the card is pulled out.
     bool PowerUp();
     void PowerDown();
-    bool Powered() const { return master_ >= 0; }
+    bool Powered() const;
     bool Inserted() const { return inserted_; }
     std::string DevicePath() const;
 
@@ -82,6 +82,10 @@ class CardSim {
     SimConfig config_;
     CardEngine engine_;
     mutable std::mutex mutex_;  // guards the engine and the descriptors
+    // Held for a whole power-up or power-down: the control socket, a script and the card
+    // manager may switch the power at the same moment, and only one may start or join the
+    // card's thread.
+    std::mutex powerMutex_;
     int master_ = -1;
     std::string slavePath_;
     std::thread worker_;

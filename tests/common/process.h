@@ -12,6 +12,8 @@
 #include <thread>
 #include <utility>
 
+#include "tests/common/wait.h"
+
 namespace vqm::testing {
 
 // Output (stdout and stderr) and exit status of a shell command.
@@ -23,17 +25,6 @@ inline std::pair<std::string, int> RunShell(const std::string& command) {
         output += buffer;
     const int status = pipe ? pclose(pipe) : -1;
     return {output, WIFEXITED(status) ? WEXITSTATUS(status) : -1};
-}
-
-template <typename Condition>
-bool WaitFor(Condition condition,
-             std::chrono::milliseconds limit = std::chrono::milliseconds(5000)) {
-    const auto end = std::chrono::steady_clock::now() + limit;
-    while (!condition()) {
-        if (std::chrono::steady_clock::now() > end) return false;
-        std::this_thread::sleep_for(std::chrono::milliseconds(10));
-    }
-    return true;
 }
 
 // A program started through the shell (so the command may set variables and redirect), ended

@@ -10,12 +10,17 @@
 #include <QLabel>
 #include <filesystem>
 
+#include "calls/dial_pad_view.h"
+#include "cardsim/card_sim.h"
 #include "link/link.h"
 #include "shell/dialogs.h"
 #include "shell/messages.h"
 #include "support/local_socket.h"
 #include "support/settings_store.h"
+#include "support/text.h"
+#include "tests/common/sim_card_host.h"
 #include "tests/common/temp_folder.h"
+#include "tests/common/wait.h"
 #include "tests/shell/fake_card_host.h"
 
 namespace vqm {
@@ -215,6 +220,70 @@ TEST(MainWindowLook, ScreenshotsOfEachCardState) {
     EXPECT_EQ(first->text(), "Searching network...");
     EXPECT_TRUE(window.grab().save(QString::fromStdString(folder + "/shell-connected.png")));
 }
+
+
+// Exit in the middle of a call, on both personalities of the card: every view, and the workers
+// it joins, goes while the window's message layer and card host are still there. (Under the
+// address sanitizer, a view waiting on a layer already gone is a use after free.)
+class MainWindowExitTest : public ::testing::TestWithParam<cardsim::Dialect> {};
+
+TEST_P(MainWindowExitTest, ExitDuringACallTakesTheViewsDownFirst) {
+    const testing::TempFolder temp;
+    SettingsStore settings(temp / "settings.db");
+    SetSettingString(settings, u"InstallPath", Utf8ToUtf16(temp / "install").c_str());
+    std::filesystem::create_directories(temp / "install");
+    Link link(settings, DriverRoots{temp / "run", temp / "tty"});
+    Dialogs dialogs;
+    dialogs.SetResponder([](const DialogRequest&) { return kIdCancel; });
+    ShellContext context{settings, link, dialogs, temp / "run"};
+    cardsim::SimConfig config;
+    config.baud = 0;
+    config.engine.dialect = GetParam();
+    config.engine.dialDelayMs = 200;
+    config.engine.ringTimeoutMs = 600000;
+    cardsim::CardSim sim(config);
+    ASSERT_TRUE(sim.PowerUp());
+    testing::SimCardHost host(link);
+    host.device = sim.DevicePath();
+    host.companion = true;
+
+    auto window = std::make_unique<MainWindow>(context, DefaultViewFactories(), &host);
+    window->StopWatchTimer();
+    host.messages = &window->Messages();
+    ASSERT_EQ(host.OpenLink(), 1);
+    window->Watch().SetCardState(2);
+    auto* pad = dynamic_cast<DialPadView*>(window->ViewAt(kViewDialPad));
+    ASSERT_NE(pad, nullptr);
+    ASSERT_EQ(pad->Dial(u"+447700900123"), 1);
+    const auto pump = [] { QApplication::processEvents(QEventLoop::AllEvents, 20); };
+    ASSERT_TRUE(testing::WaitFor(
+        testing::PumpingFor(
+            pump, [&] { return sim.Control("status").find("call=none") == std::string::npos; }),
+        std::chrono::seconds(10)));
+
+    int viewsGone = 0, goneWithTheLayer = 0;
+    MessageLayer* const layer = &window->Messages();
+    for (int i = 0; i < kViewCount; ++i)
+        if (View* view = window->ViewAt(i))
+            QObject::connect(view, &QObject::destroyed, [&] {
+                ++viewsGone;
+                if (context.messages == layer && context.mainWindow)
+                    ++goneWithTheLayer;
+            });
+    window->Command(kCmdExit);  // hangs up, closes the link
+    window.reset();
+    EXPECT_EQ(viewsGone, kViewCount);
+    EXPECT_EQ(goneWithTheLayer, kViewCount);
+    EXPECT_EQ(context.messages, nullptr);
+    EXPECT_EQ(context.mainWindow, nullptr);
+    PortClose(link);
+}
+
+INSTANTIATE_TEST_SUITE_P(Dialects, MainWindowExitTest,
+                         ::testing::Values(cardsim::Dialect::Card, cardsim::Dialect::Standard),
+                         [](const ::testing::TestParamInfo<cardsim::Dialect>& info) {
+                             return info.param == cardsim::Dialect::Card ? "card" : "standard";
+                         });
 
 }  // namespace
 }  // namespace vqm
