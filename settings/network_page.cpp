@@ -88,6 +88,8 @@ void NetworkPage::ShowMode(int mode) {
 }
 
 void NetworkPage::Automatic() {
+    // The page shows manual selection exactly while its list is open.
+    const bool wasManual = networks_->isEnabled();
     const bool ran = exchange_.Run(
         [this] {
             const int result = NetworkAutomatic(context_.link);
@@ -99,12 +101,12 @@ void NetworkPage::Automatic() {
             }
             return result;
         },
-        [this](int result) {
+        [this, wasManual](int result) {
             if (result == -1 || result == kResultError) {
                 Box(u"Network registration failure.", kMbIconError);
-                // The buttons show the selection the card still has.
-                manual_->setChecked(mode_ != 0);
-                automatic_->setChecked(mode_ == 0);
+                // Nothing changes: the buttons go back to what the page showed.
+                manual_->setChecked(wasManual);
+                automatic_->setChecked(!wasManual);
                 return;
             }
             mode_ = 0;
@@ -114,7 +116,10 @@ void NetworkPage::Automatic() {
             search_->setEnabled(false);
             register_->setEnabled(false);
         });
-    if (!ran) automatic_->setChecked(mode_ == 0);
+    if (!ran) {
+        manual_->setChecked(wasManual);
+        automatic_->setChecked(!wasManual);
+    }
 }
 
 void NetworkPage::Manual() {

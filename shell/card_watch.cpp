@@ -80,8 +80,13 @@ bool CardWatch::ConnectIfReady() {
     busy_.BeginBusy();
     ui_.ShowStatus(u"Initializing...", u"");
     ui_.UpdateWindow();
-    if (card_.OpenLink()) SetCardState(2);
+    const int opened = ui_.RunAside([this] { return card_.OpenLink(); });
     busy_.EndBusy();
+    if (ui_.ShuttingDown()) {
+        if (opened) card_.CloseLink();  // the exit came while the card was being initialised
+        return true;
+    }
+    if (opened) SetCardState(2);
     return true;
 }
 

@@ -3,6 +3,7 @@
 // manager and the card. Tests put scripted versions of both in their place.
 #pragma once
 
+#include <functional>
 #include <mutex>
 #include <optional>
 #include <string>
@@ -38,6 +39,11 @@ class ShellUi {
     virtual void ShowDialPad() = 0;
     // Sends the message to the seven views in table order.
     virtual void SendToViews(unsigned msg, long wParam, long lParam) = 0;
+    // Runs work that holds the card for seconds (the link's opening) and returns its result;
+    // a window runs it on a helper thread and keeps painting meanwhile.
+    virtual int RunAside(const std::function<int()>& work) { return work(); }
+    // The program is on its way out (an exit came while work ran aside).
+    virtual bool ShuttingDown() const { return false; }
 };
 
 class CardHost {

@@ -5,6 +5,7 @@
 #include <QCloseEvent>
 #include <QDialog>
 #include <QDialogButtonBox>
+#include <QEventLoop>
 #include <QKeyEvent>
 #include <QLabel>
 #include <QMenu>
@@ -13,6 +14,7 @@
 #include <QToolBar>
 #include <QToolButton>
 #include <QVBoxLayout>
+#include <atomic>
 #include <cstdio>
 
 #include "link/link.h"
@@ -405,6 +407,23 @@ void MainWindow::Foreground() {
 
 void MainWindow::UpdateWindow() {
     repaint();
+}
+
+int MainWindow::RunAside(const std::function<int()>& work) {
+    // The window keeps painting and taking the card's and the sockets' messages while the work
+    // runs; a person's input waits, as the busy look says.
+    QEventLoop loop;
+    std::atomic<bool> done{false};
+    int result = 0;
+    std::thread helper([&] {
+        result = work();
+        done = true;
+        QMetaObject::invokeMethod(&loop, &QEventLoop::quit, Qt::QueuedConnection);
+    });
+    // An exit meanwhile ends the loop early; the work is bounded and is waited for all the same.
+    if (!done.load()) loop.exec(QEventLoop::ExcludeUserInputEvents);
+    helper.join();
+    return result;
 }
 
 void MainWindow::SetBusyLook(bool busy) {

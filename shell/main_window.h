@@ -80,6 +80,8 @@ class MainWindow : public QWidget, public MessageTarget, public ShellUi {
     void EnableViewButton(int index, bool enable) override;
     void ShowDialPad() override;
     void SendToViews(unsigned msg, long wParam, long lParam) override;
+    int RunAside(const std::function<int()>& work) override;
+    bool ShuttingDown() const override { return shutDown_; }
 
     AppState& App() { return app_; }
     ViewSet& Views() { return views_; }
