@@ -1,0 +1,293 @@
+#include "settings/forward_page.h"
+
+#include <QApplication>
+#include <QComboBox>
+#include <QDialogButtonBox>
+#include <QGridLayout>
+#include <QLabel>
+#include <QLineEdit>
+#include <QMetaObject>
+#include <QPushButton>
+#include <QRadioButton>
+#include <QVBoxLayout>
+#include <cstdio>
+
+#include "settings/forwarding_at.h"
+#include "shell/card_watch.h"
+#include "shell/dialogs.h"
+#include "support/settings_store.h"
+
+namespace vqm {
+
+namespace {
+
+constexpr char16_t kNotActive[] = u"NOT ACTIVE";
+constexpr char16_t kUnknown[] = u"Unknown";
+constexpr const char* kRowLabels[4] = {"All Calls:", "If Busy:", "Unanswered:", "Not Reachable:"};
+constexpr const char* kClassNames[ForwardPage::kClasses] = {"Voice", "Data", "Fax"};
+constexpr const char* kPageClasses[ForwardPage::kClasses] = {
+    "SETTINGS_CALLFORWARD_VOICE_PAGE", "SETTINGS_CALLFORWARD_DATA_PAGE",
+    "SETTINGS_CALLFORWARD_FAX_PAGE"};
+constexpr int kRowHeight = 20, kRowStep = 26, kMargin = 5, kLabelWidth = 88;
+
+QString Q(const std::u16string& text) {
+    return QString::fromStdU16String(text);
+}
+
+// "CallForward<class><reason>": the last number forwarded to for the pair.
+std::u16string StoredNumberName(int serviceClass, int reason) {
+    char narrow[32];
+    std::snprintf(narrow, sizeof narrow, "CallForward%d%d", serviceClass, reason);
+    return std::u16string(narrow, narrow + std::char_traits<char>::length(narrow));
+}
+
+}  // namespace
+
+// CardJobs
+
+CardJobs::CardJobs(QObject* owner, ShellContext& context) : owner_(owner), context_(context) {}
+
+CardJobs::~CardJobs() {
+    worker_.Stop();
+    worker_.Join();
+    // Results that will not be delivered any more must not keep the window busy.
+    while (pending_ > 0) {
+        --pending_;
+        Busy(false);
+    }
+}
+
+void CardJobs::Busy(bool busy) {
+    if (context_.mainWindow) {
+        BusyIndicator& indicator = context_.mainWindow->Busy();
+        busy ? indicator.BeginBusy() : indicator.EndBusy();
+    } else if (busy) {
+        QApplication::setOverrideCursor(Qt::WaitCursor);
+    } else {
+        QApplication::restoreOverrideCursor();
+    }
+}
+
+void CardJobs::Run(std::function<int(Link&)> exchange, std::function<void(int)> done) {
+    ++pending_;
+    Busy(true);
+    worker_.Post([this, exchange = std::move(exchange), done = std::move(done)] {
+        const int result = exchange(context_.link);
+        QMetaObject::invokeMethod(
+            owner_,
+            [this, done, result] {
+                --pending_;
+                Busy(false);
+                if (done) done(result);
+            },
+            Qt::QueuedConnection);
+    });
+}
+
+// ForwardDialog
+
+ForwardDialog::ForwardDialog(QWidget* parent, SettingsStore& settings, int serviceClass,
+                             int reason, const QString& rowText)
+    : QDialog(parent), settings_(settings), serviceClass_(serviceClass), reason_(reason) {
+    setObjectName("FORWARD_REQUEST_DIALOG");
+    setWindowTitle("Forward Request");
+    auto* layout = new QVBoxLayout(this);
+    activate_ = new QRadioButton("Activate To:", this);
+    SetControlId(activate_, kForwardActivateRadioId);
+    number_ = new QLineEdit(rowText, this);
+    SetControlId(number_, kForwardNumberEditId);
+    number_->setMaxLength(32);
+    deactivate_ = new QRadioButton("Deactivate", this);
+    SetControlId(deactivate_, kForwardDeactivateRadioId);
+    // The two choices are checked by hand, so that the dialog opens with neither.
+    activate_->setAutoExclusive(false);
+    deactivate_->setAutoExclusive(false);
+    auto* timeRow = new QHBoxLayout();
+    timeRow->addWidget(new QLabel("Time Out Limit", this));
+    time_ = new QComboBox(this);
+    SetControlId(time_, kForwardTimeListId);
+    time_->addItems({"10", "20", "30"});
+    time_->setCurrentIndex(1);
+    time_->setEnabled(false);
+    timeRow->addWidget(time_);
+    layout->addWidget(activate_);
+    layout->addWidget(number_);
+    layout->addWidget(deactivate_);
+    layout->addLayout(timeRow);
+    layout->addStretch();
+    auto* buttons = new QDialogButtonBox(this);
+    buttons->addButton("Send Request", QDialogButtonBox::AcceptRole);
+    buttons->addButton(QDialogButtonBox::Cancel);
+    QObject::connect(buttons, &QDialogButtonBox::accepted, this, [this] { done(1); });
+    QObject::connect(buttons, &QDialogButtonBox::rejected, this, [this] { done(-1); });
+    layout->addWidget(buttons);
+    QObject::connect(activate_, &QRadioButton::clicked, this, [this] { ChooseActivate(); });
+    QObject::connect(deactivate_, &QRadioButton::clicked, this, [this] { ChooseDeactivate(); });
+}
+
+void ForwardDialog::ChooseActivate() {
+    activate_->setChecked(true);
+    deactivate_->setChecked(false);
+    time_->setEnabled(reason_ == kForwardNoReply);
+    char16_t stored[33] = u"";
+    if (!GetSettingString(settings_, StoredNumberName(serviceClass_, reason_).c_str(), stored,
+                          std::size(stored)))
+        std::char_traits<char16_t>::copy(stored, kUnknown, std::size(kUnknown));
+    number_->setText(QString::fromStdU16String(stored));
+    number_->setFocus();
+    number_->selectAll();
+}
+
+void ForwardDialog::ChooseDeactivate() {
+    deactivate_->setChecked(true);
+    activate_->setChecked(false);
+    time_->setEnabled(false);
+}
+
+int ForwardDialog::Seconds() const {
+    return reason_ == kForwardNoReply ? (time_->currentIndex() + 1) * 10 : 20;
+}
+
+// ForwardPage
+
+ForwardPage::ForwardPage(QWidget* parent, ShellContext& context)
+    : View(parent), context_(context), jobs_(this, context) {
+    setObjectName("SETTINGS_CALLFORWARD_PAGE");
+    if (parent) resize(parent->size());
+    for (int i = 0; i < kClasses; ++i) {
+        ViewRecord record;
+        record.caption = QString(kClassNames[i]).toStdU16String();
+        record.className = kPageClasses[i];
+        record.windowProc = [this, i](QWidget* pageParent) -> View* {
+            auto* page = new View(pageParent);
+            BuildSubPage(page, i);
+            return page;
+        };
+        pages_.records.push_back(std::move(record));
+    }
+    // The tabs take the page but for the button row below them.
+    const int buttonTop = height() - kMargin - kRowHeight;
+    CreateTabbedPages(this, kForwardTabId, pages_, QRect(0, 0, width(), buttonTop - kMargin));
+    auto* all = new QPushButton("Deactivate All Call Forward", this);
+    SetControlId(all, kForwardDeactivateAllId);
+    all->setGeometry(kMargin, buttonTop, width() - 2 * kMargin, kRowHeight);
+    QObject::connect(all, &QPushButton::clicked, this, [this] { DeactivateAll(); });
+}
+
+ForwardPage::~ForwardPage() = default;
+
+void ForwardPage::BuildSubPage(View* page, int index) {
+    const int width = page->width() > 0 ? page->width() : this->width();
+    const int editLeft = kMargin + kLabelWidth;
+    const int buttonLeft = width - kMargin - kRowHeight;
+    for (int reason = 0; reason < 4; ++reason) {
+        const int top = kMargin + reason * kRowStep;
+        auto* label = new QLabel(kRowLabels[reason], page);
+        label->setGeometry(kMargin, top, kLabelWidth, kRowHeight);
+        auto* state = new QLineEdit(Q(kUnknown), page);
+        state->setReadOnly(true);
+        SetControlId(state, kForwardStateFirstId + reason);
+        state->setGeometry(editLeft, top, buttonLeft - editLeft - 4, kRowHeight);
+        auto* button = new QPushButton("...", page);
+        SetControlId(button, kForwardButtonFirstId + reason);
+        button->setGeometry(buttonLeft, top, kRowHeight, kRowHeight);
+        button->setToolTip("Change this forward");
+        QObject::connect(button, &QPushButton::clicked, this,
+                         [this, index, reason] { OpenRow(index, reason); });
+    }
+    const int top = kMargin + 4 * kRowStep + kMargin;
+    auto* request = new QPushButton(QString("Request %1 Forward").arg(kClassNames[index]), page);
+    SetControlId(request, kForwardRequestId);
+    request->setGeometry(kMargin, top, width - 2 * kMargin, kRowHeight);
+    QObject::connect(request, &QPushButton::clicked, this, [this, index] { Request(index); });
+    auto* off =
+        new QPushButton(QString("Deactivate All %1 Forward").arg(kClassNames[index]), page);
+    SetControlId(off, kForwardDeactivateClassId);
+    off->setGeometry(kMargin, top + 25, width - 2 * kMargin, kRowHeight);
+    QObject::connect(off, &QPushButton::clicked, this, [this, index] { DeactivateClass(index); });
+}
+
+QLineEdit* ForwardPage::State(int index, int reason) const {
+    return qobject_cast<QLineEdit*>(FindControl(SubPage(index), kForwardStateFirstId + reason));
+}
+
+QPushButton* ForwardPage::RowButton(int index, int reason) const {
+    return qobject_cast<QPushButton*>(FindControl(SubPage(index), kForwardButtonFirstId + reason));
+}
+
+void ForwardPage::EnableConditionalRows(int index, bool enable) {
+    for (int reason = 1; reason < 4; ++reason) {
+        State(index, reason)->setEnabled(enable);
+        RowButton(index, reason)->setEnabled(enable);
+    }
+}
+
+void ForwardPage::Request(int index) {
+    const int serviceClass = ClassOf(index);
+    for (int reason = 0; reason < 4; ++reason) {
+        auto number = std::make_shared<std::u16string>();
+        jobs_.Run(
+            [serviceClass, reason, number](Link& link) {
+                char16_t text[33] = u"";
+                const int result = QueryForward(link, serviceClass, reason, text, std::size(text));
+                *number = text;
+                return result;
+            },
+            [this, index, reason, number](int result) {
+                State(index, reason)
+                    ->setText(result == 1 ? Q(*number) : Q(result == 0 ? kNotActive : kUnknown));
+                // Unconditional forwarding takes every call, so the conditional ones do not
+                // apply while it is on.
+                if (reason == kForwardUnconditional && (result == 0 || result == 1))
+                    EnableConditionalRows(index, result == 0);
+            });
+    }
+}
+
+void ForwardPage::OpenRow(int index, int reason) {
+    const int serviceClass = ClassOf(index);
+    ForwardDialog dialog(this, context_.settings, serviceClass, reason,
+                         State(index, reason)->text());
+    if (context_.dialogs.Run(&dialog) != 1) return;  // Cancel, or closed
+    const bool activate = dialog.Activate()->isChecked();
+    if (!activate && !dialog.Deactivate()->isChecked()) return;
+    const std::u16string number = dialog.Number()->text().left(32).toStdU16String();
+    const int seconds = dialog.Seconds();
+    jobs_.Run(
+        [=](Link& link) {
+            return activate ? ActivateForward(link, serviceClass, reason, number.c_str(), seconds)
+                            : EraseForward(link, serviceClass, reason);
+        },
+        [=, this](int result) {
+            if (CardFailed(result)) return;  // the row keeps its text
+            if (activate)
+                SetSettingString(context_.settings,
+                                 StoredNumberName(serviceClass, reason).c_str(), number.c_str());
+            State(index, reason)->setText(activate ? Q(number) : Q(kNotActive));
+        });
+}
+
+void ForwardPage::DeactivateClass(int index) {
+    const int serviceClass = ClassOf(index);
+    jobs_.Run([serviceClass](Link& link) { return DisableAllForwards(link, serviceClass); },
+              [this, index](int result) {
+                  if (CardFailed(result)) return;
+                  // Every reason of the class is off now, so every row says so.
+                  EnableConditionalRows(index, true);
+                  for (int reason = 0; reason < 4; ++reason)
+                      State(index, reason)->setText(Q(kNotActive));
+              });
+}
+
+void ForwardPage::DeactivateAll() {
+    jobs_.Run([](Link& link) { return DisableAllForwardsAllClasses(link); },
+              [this](int) {
+                  // Marked off whatever the card answered.
+                  for (int index = 0; index < kClasses; ++index) {
+                      State(index, kForwardUnconditional)->setText(Q(kNotActive));
+                      EnableConditionalRows(index, true);
+                  }
+              });
+}
+
+}  // namespace vqm
