@@ -4,10 +4,13 @@
 #include <QMetaObject>
 #include <QTabBar>
 
+#include "settings/barring_page.h"
 #include "settings/centre_page.h"
+#include "settings/forward_page.h"
 #include "settings/general_page.h"
 #include "settings/modem_page.h"
 #include "settings/network_page.h"
+#include "settings/security_page.h"
 #include "shell/messages.h"
 
 namespace vqm {
@@ -36,9 +39,9 @@ const PageInfo kPages[kSettingsPageCount] = {
     {u"General", "SETTINGS_GENERAL_PAGE", Make<GeneralPage>},
     {u"Messages", "SETTINGS_MESSAGES_PAGE", Make<CentrePage>},
     {u"Network", "SETTINGS_NETWORK_PAGE", Make<NetworkPage>},
-    {u"Call Forward", "SETTINGS_CALLFORWARD_PAGE", Empty},
-    {u"Call Barring", "SETTINGS_CALLBARRING_PAGE", Empty},
-    {u"Security", "SETTINGS_SECURITY_PAGE", Empty},
+    {u"Call Forward", "SETTINGS_CALLFORWARD_PAGE", Make<ForwardPage>},
+    {u"Call Barring", "SETTINGS_CALLBARRING_PAGE", Make<BarringPage>},
+    {u"Security", "SETTINGS_SECURITY_PAGE", Make<SecurityPage>},
     {u"Modem", "SETTINGS_MODEM_PAGE", Make<ModemPage>},
     {u"Call Waiting", "SETTINGS_CALLWAITING_PAGE", Empty},
     {u"Tones", "SETTINGS_TONES_PAGE", Empty},
