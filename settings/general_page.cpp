@@ -14,6 +14,7 @@ constexpr char16_t kRefreshOutlook[] = u"GeneralRefreshOutlook";
 constexpr int kMargin = 10;
 constexpr int kBoxSize = 16;
 constexpr int kLabelGap = 25;
+constexpr int kLabelHeight = 56;
 
 // A missing value shows unchecked and stays missing: only a click writes.
 bool ReadFlag(SettingsStore& store, const char16_t* name) {
@@ -64,11 +65,15 @@ void GeneralPage::Relayout() {
     const int labelLeft = inner.left() + kBoxSize + kLabelGap;
     const int labelWidth = std::max(0, inner.right() + 1 - labelLeft);
     refreshSim_->setGeometry(inner.left(), inner.top() + 60, kBoxSize, kBoxSize);
-    simLabel_->setGeometry(labelLeft, inner.top() + 60, labelWidth, 40);
+    // On a narrow window a line wraps within its label; the label grows by the one line that
+    // can take.
+    simLabel_->setGeometry(labelLeft, inner.top() + 60, labelWidth, kLabelHeight);
     refreshOutlook_->setGeometry(inner.left(), inner.top() + 120, kBoxSize, kBoxSize);
-    outlookLabel_->setGeometry(labelLeft, inner.top() + 120, labelWidth, 40);
-    simLabel_->setAlignment(Qt::AlignLeft | Qt::AlignTop);
-    outlookLabel_->setAlignment(Qt::AlignLeft | Qt::AlignTop);
+    outlookLabel_->setGeometry(labelLeft, inner.top() + 120, labelWidth, kLabelHeight);
+    for (QLabel* label : {simLabel_, outlookLabel_}) {
+        label->setAlignment(Qt::AlignLeft | Qt::AlignTop);
+        label->setWordWrap(true);
+    }
 }
 
 }  // namespace vqm

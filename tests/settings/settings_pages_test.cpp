@@ -434,5 +434,38 @@ TEST_P(SettingsPagesTest, ModemPageWritesTheCommandOnSelectionClickAndLeaving) {
     EXPECT_EQ(command(), u"AT+CBST=51,0,1;+CHSN=4,0,0,0");
 }
 
+// Every page of the view as a person sees it on the narrow window, with a search listed and a
+// centre chosen, for a look at the layout.
+TEST_P(SettingsPagesTest, ScreenshotOfEveryPage) {
+    const std::string folder = VQM_SCREENSHOT_DIR;
+    std::filesystem::create_directories(folder);
+    CentreEntry home;
+    home.name = u"Home";
+    home.number = u"+306900000";
+    SaveCentre(settings_, 0, home);
+    SaveCentre(settings_, 1, CentreEntry{});
+    SaveChosenCentre(settings_, 0);
+    SaveUseSimDefault(settings_, false);
+    SettingsView view(&host_, context_);
+    view.SetCardStateSource([] { return 2; });
+    view.OnMessage(kMsgCardStateChanged, 0, 0);
+    auto* network = dynamic_cast<NetworkPage*>(view.Page(kSettingsNetwork));
+    auto* centres = dynamic_cast<CentrePage*>(view.Page(kSettingsMessages));
+    ASSERT_TRUE(WaitFor([&] { return !network->Busy() && !centres->Busy(); }));
+    network->ManualButton()->click();
+    network->Search();
+    ASSERT_TRUE(WaitFor([&] { return !network->Busy(); }));
+    host_.show();
+    auto* tabs = qobject_cast<QTabBar*>(FindControl(&view, kSettingsTabId));
+    const std::string dialect = GetParam() == Dialect::Card ? "card" : "standard";
+    for (int i = 0; i < kSettingsPageCount; ++i) {
+        tabs->setCurrentIndex(i);
+        QApplication::processEvents();
+        const std::string name = tabs->tabText(i).toLower().replace(' ', '-').toStdString();
+        EXPECT_TRUE(view.grab().save(
+            QString::fromStdString(folder + "/settings-" + name + "-" + dialect + ".png")));
+    }
+}
+
 }  // namespace
 }  // namespace vqm
