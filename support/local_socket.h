@@ -8,6 +8,8 @@
 //   card control:    "ring +4412345\n"       ->  "OK\n" or "ERROR: reason\n"
 #pragma once
 
+#include <chrono>
+#include <cstddef>
 #include <functional>
 #include <optional>
 #include <string>
@@ -26,8 +28,18 @@ inline constexpr unsigned kMsgSimFullCleared = 2029;
 inline constexpr unsigned kMsgCardPowerUp = 2030;
 inline constexpr unsigned kMsgCardPowerDown = 2031;
 
+// What one server allows its clients, so that no client, and no crowd of them, can take the
+// server's thread or the program's descriptors.
+struct LineServerLimits {
+    size_t maxClients = 64;  // more: the one idle longest makes room
+    std::chrono::milliseconds idle{30000};  // a client silent this long is dropped
+    size_t maxUnsent = 64 * 1024;  // replies a client leaves unread; more and it is dropped
+};
+
 // Serves one socket on its own thread. Clients are served in turn, one line at a time, so a
-// client that connects and says nothing holds up nobody.
+// client that connects and says nothing holds up nobody. Only the user's own programs are
+// served: the socket is the user's alone (mode 0600, in a folder made 0700), and a client
+// whose credentials name another user is closed at once.
 class LineServer {
   public:
     using Handler = std::function<std::string(const std::string& line)>;
@@ -43,12 +55,16 @@ class LineServer {
     // Stops serving and removes the socket file.
     void Stop();
     bool Running() const { return listenFd_ >= 0; }
+    // Before Start.
+    void SetLimits(const LineServerLimits& limits) { limits_ = limits; }
 
   private:
     void Run();
-    void Serve(int client, std::string& pending);
+    // Answers every whole line of pending; the replies go to unsent.
+    void Serve(std::string& pending, std::string& unsent);
 
     Handler handler_;
+    LineServerLimits limits_;
     std::string path_;
     int listenFd_ = -1;
     int wakeFds_[2] = {-1, -1};
@@ -56,11 +72,13 @@ class LineServer {
 };
 
 // One request line, one reply line (without its line end); nothing when nobody answers at
-// path or the reply does not come within timeoutMs.
+// path or the reply does not come within timeoutMs. timeoutMs bounds the whole exchange, the
+// connection included: a server that is stopped with its queue full cannot hold the caller.
 std::optional<std::string> SendLine(const std::string& path, const std::string& line,
                                     int timeoutMs);
-// True when a server accepts connections at path.
-bool ServerAnswers(const std::string& path);
+// True when a server accepts connections at path (or is there but too busy to take one
+// within timeoutMs).
+bool ServerAnswers(const std::string& path, int timeoutMs = 1000);
 
 // The window-message form of the protocol.
 using WindowProc = std::function<long(unsigned msg, long wParam, long lParam)>;
