@@ -10,6 +10,7 @@
 #include "link/device_at.h"
 #include "link/link.h"
 #include "messaging/message_store.h"
+#include "settings/call_waiting_at.h"
 #include "support/local_socket.h"
 #include "support/settings_store.h"
 #include "support/text.h"
@@ -131,6 +132,23 @@ int OnCallerId(DialPad& pad, const EventRecord& record) {
     return 0;
 }
 
+int OnCallWaiting(DialPad& pad, const EventRecord& record) {
+    if (pad.CallState() != kCallVoice) return 0;
+    char number[64];
+    const int length = ParseCallWaitingLine(record.text, record.length, number, sizeof number);
+    std::u16string shown = u"No number";
+    if (length > 0) {
+        char16_t wide[64];
+        NarrowToWide(number, wide, length, 64);
+        shown = wide;
+        char16_t name[64] = {};
+        if (FindNameByNumber(pad.Caches(), number, name, 64) && name[0])
+            shown = std::u16string(name) + u" " + shown;
+    }
+    pad.SetStatusLine(3, u"Waiting: " + shown);
+    return 0;
+}
+
 int NewMessageLocation(const EventRecord& record, char* memory, size_t memorySize) {
     const int length = record.length;
     if (length < 7) return -1;
@@ -206,6 +224,10 @@ void InstallCallHandlers(UnsolicitedEvents& events, DialPad& pad,
     });
     events.SetHandler(kEventNewMessage, [&pad, onPadThread](const EventRecord& record) {
         onPadThread([&] { OnNewMessage(pad, record); });
+        return 0;
+    });
+    events.SetHandler(kEventCallWaiting, [&pad, onPadThread](const EventRecord& record) {
+        onPadThread([&] { OnCallWaiting(pad, record); });
         return 0;
     });
 }

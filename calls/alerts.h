@@ -34,6 +34,11 @@ int OnIncomingCall(DialPad& pad, const EventRecord& record);
 // and in the number display. Returns 0.
 int OnCallerId(DialPad& pad, const EventRecord& record);
 
+// "+CCWA:": a second caller waits behind the call in progress. The number (and its name) goes on
+// status line 3 as "Waiting: ..."; the call, its state, the display and the ring tone stay as
+// they are. Outside a voice call the line means nothing and is ignored. Returns 0.
+int OnCallWaiting(DialPad& pad, const EventRecord& record);
+
 // "+CMTI:": the location joins the new messages (the full-SIM alert first when the SIM is full)
 // and the DialPad announces the unread count. Returns 0.
 int OnNewMessage(DialPad& pad, const EventRecord& record);
@@ -56,9 +61,9 @@ void NotifySimFull(DialPad& pad, int full);
 // it speaks of opens: the Call Log for unanswered calls, the SMS Folder otherwise.
 void NotificationTapped(DialPad& pad);
 
-// Installs OnIncomingCall, OnCallerId and OnNewMessage into the events' table. Handlers may be
-// dispatched on the listener or the dial thread; onPadThread runs the work on the DialPad's own
-// thread and waits for it.
+// Installs OnIncomingCall, OnCallerId, OnNewMessage and OnCallWaiting into the events' table.
+// Handlers may be dispatched on the listener or the dial thread; onPadThread runs the work on the
+// DialPad's own thread and waits for it.
 void InstallCallHandlers(UnsolicitedEvents& events, DialPad& pad,
                          std::function<void(const std::function<void()>&)> onPadThread);
 

@@ -8,6 +8,7 @@
 #include "contacts/phonebook_cache.h"
 #include "link/link.h"
 #include "link/voice_at.h"
+#include "settings/call_waiting_at.h"
 #include "shell/messages.h"
 #include "support/local_socket.h"
 #include "support/numbers.h"
@@ -517,6 +518,8 @@ void DialPad::OnCardState(int state) {
     ui_.SetSliderPosition(level);
     worker_.Post(
         [this, level] { ui_.PostToDialPad(kMsgVolumeSet, SetSpeakerVolume(link_, level), level); });
+    // A standard modem keeps a waiting caller to itself until asked to present it.
+    worker_.Post([this] { PresentCallWaiting(link_); });
     const int32_t poweredUp = 0;
     SetSettingInt(settings_, u"DialPadPowerDown", &poweredUp);
     ticks_ = 0;

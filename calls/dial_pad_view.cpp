@@ -147,6 +147,8 @@ class PadKey : public QAbstractButton {
 QLabel* ReadOnlyText(QWidget* parent, int id, const QRect& where, int pixels, bool bold,
                      Qt::Alignment align, const QColor& ink) {
     auto* label = new FittedText(parent);
+    // Caller ids come from the network: whatever they hold is shown as typed, never as markup.
+    label->setTextFormat(Qt::PlainText);
     SetControlId(label, id);
     label->setGeometry(where);
     label->setAlignment(align | Qt::AlignVCenter);

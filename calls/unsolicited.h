@@ -1,4 +1,4 @@
-// The unsolicited codes the card mixes into its replies ("+CRING:", "+CLIP:", "+CMTI:"):
+// The unsolicited codes the card mixes into its replies ("+CRING:", "+CLIP:", "+CMTI:", "+CCWA:"):
 // recognised in any text read from the port, queued in the event log, and handed one at a
 // time to the handler of their row.
 #pragma once
@@ -20,12 +20,15 @@ struct UnsolicitedCode {
     int tagLength;
 };
 
-// Row order matters: it is the record's type and the order of the scan.
-inline constexpr std::array<UnsolicitedCode, 3> kUnsolicitedCodes = {{
+// Row order matters: it is the record's type and the order of the scan. The last row is a
+// second caller waiting behind the call in progress.
+inline constexpr std::array<UnsolicitedCode, 4> kUnsolicitedCodes = {{
     {"+CRING:", 7},
     {"+CLIP:", 6},
     {"+CMTI:", 6},
+    {"+CCWA:", 6},
 }};
+inline constexpr EventType kEventCallWaiting = static_cast<EventType>(3);
 
 class UnsolicitedEvents : public EventSink {
   public:

@@ -58,6 +58,10 @@ Handled CallWaiting::Run(const std::string& upper, const std::string& original, 
         errorText = engine_ ? engine_->MeError(kNotAllowed) : "ERROR";
         return Handled::Error;
     }
+    if (!subscribed_) {
+        errorText = engine_ ? engine_->MeError(kNotAllowed) : "ERROR";
+        return Handled::Error;
+    }
     presentation_ = presentation == 1;
     const int asked = serviceClass & kAllClasses;
     if (mode == 2) {
@@ -81,34 +85,46 @@ Handled CallWaiting::Run(const std::string& upper, const std::string& original, 
 
 std::string CallWaiting::Control(const std::string& command, const std::string& rest) {
     if (command == "call-waiting") {
-        if (rest.empty())
-            return std::string("OK ") + ((classes_ & 1) ? "on" : "off") +
-                   (last_.empty() ? "" : " last=" + last_);
-        if (rest != "on" && rest != "off") return "ERROR: call-waiting takes on or off";
+        if (rest.empty()) {
+            const char* setting = !subscribed_ ? "none" : (classes_ & 1) ? "on" : "off";
+            return std::string("OK ") + setting + (last_.empty() ? "" : " last=" + last_);
+        }
+        if (rest == "none") {
+            if (subscribed_ && engine_) engine_->MarkChanged();
+            subscribed_ = false;
+            return "OK";
+        }
+        if (rest != "on" && rest != "off") return "ERROR: call-waiting takes on, off or none";
         const int next = rest == "on" ? (classes_ | 1) : (classes_ & ~1);
-        if (next != classes_ && engine_) engine_->MarkChanged();
+        if ((next != classes_ || !subscribed_) && engine_) engine_->MarkChanged();
         classes_ = next;
+        subscribed_ = true;
         return "OK";
     }
     if (command != "ring" || !engine_ || rest.empty()) return {};
-    if (engine_->State() != CallState::Active || !(classes_ & 1)) return {};
+    if (engine_->State() != CallState::Active || !subscribed_ || !(classes_ & 1)) return {};
     if (!engine_->RingWaiting(rest, Presenting(), Clock::now()))
         return "ERROR: a caller is waiting already";
     return "OK";
 }
 
 std::string CallWaiting::ControlHelp() const {
-    return "  call-waiting [on|off]    the network's call waiting for voice: with it on, a ring\n"
-           "                           during a call waits behind it (\"+CCWA:\"); alone, the\n"
-           "                           setting and the last +CCWA command the card was sent\n";
+    return "  call-waiting [on|off|none]  the network's call waiting for voice: with it on, a\n"
+           "                           ring during a call waits behind it (\"+CCWA:\"); none:\n"
+           "                           not subscribed, +CCWA refused; alone, the setting and\n"
+           "                           the last +CCWA command the card was sent\n";
 }
 
 void CallWaiting::Save(std::ostream& out) const {
-    out << "call-waiting " << classes_ << "\n";
+    if (subscribed_)
+        out << "call-waiting " << classes_ << "\n";
+    else
+        out << "call-waiting none\n";
 }
 
 bool CallWaiting::Load(const std::string& name, const std::string& rest) {
     if (name != "call-waiting") return false;
+    subscribed_ = rest != "none";
     std::vector<Argument> fields{Argument{rest, false, true}};
     int value = 0;
     if (FieldValue(fields, 0, 0, kAllClasses, 0, &value)) classes_ = value;

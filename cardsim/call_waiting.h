@@ -18,13 +18,18 @@ class CallWaiting : public CommandSet {
     // "ring NUMBER" during an active call is this group's while waiting is on for voice; at any
     // other time it is left to the engine (which refuses it during a call). "call-waiting"
     // reports the setting and the last "+CCWA" command the card was sent ("OK on
-    // last=+CCWA=1,2,1"), "call-waiting on|off" changes it from the network side.
+    // last=+CCWA=1,2,1"), "call-waiting on|off" changes it from the network side, and
+    // "call-waiting none" takes the service off the subscription: every +CCWA command is then
+    // refused until it is switched on or off again.
     std::string Control(const std::string& command, const std::string& rest) override;
     std::string ControlHelp() const override;
     void Save(std::ostream& out) const override;
     bool Load(const std::string& name, const std::string& rest) override;
     // Off for every class, as on a new subscription.
-    void FillDemo() override { classes_ = 0; }
+    void FillDemo() override {
+        classes_ = 0;
+        subscribed_ = true;
+    }
 
     // Class bits (1 voice, 2 data, 4 fax) with waiting on.
     int Classes() const { return classes_; }
@@ -32,6 +37,7 @@ class CallWaiting : public CommandSet {
 
   private:
     int classes_ = 0;
+    bool subscribed_ = true;
     bool presentation_ = false;  // "+CCWA=1" was sent
     std::string last_;           // the last "+CCWA" command as sent, for the network side to see
 };

@@ -3,14 +3,16 @@
 #include <cstdint>
 
 #include "link/link.h"
-#include "settings/at_common.h"
 #include "support/field_cursor.h"
 
 namespace vqm {
 
 namespace {
 constexpr char kCcwaTag[] = "+CCWA:";
-}
+// The network answers a supplementary-service request in seconds; a card silent this long
+// will not answer, and the page's buttons must not stay grey for ever.
+constexpr int kNetworkAnswerLimitMs = 30000;
+}  // namespace
 
 int ParseCallWaitingReply(const char* reply, int length) {
     if (!reply || length <= 0) return kWaitingUnknown;
@@ -54,8 +56,19 @@ int QueryCallWaiting(Link& link) {
     return ParseCallWaitingReply(reply, length);
 }
 
+int PresentCallWaiting(Link& link) {
+    char reply[256];
+    const int length = static_cast<int>(
+        AtCommandWithin(link, "AT+CCWA=1\r", reply, sizeof reply, kQueryAnswerLimitMs));
+    return length == 0 ? -1 : AtFinalResult(reply, length);
+}
+
 int SetCallWaiting(Link& link, int enable) {
-    return settings_detail::CommandResult(link, enable ? "AT+CCWA=1,1,1\r" : "AT+CCWA=1,0,1\r");
+    char reply[256];
+    const int length =
+        static_cast<int>(AtCommandWithin(link, enable ? "AT+CCWA=1,1,1\r" : "AT+CCWA=1,0,1\r",
+                                         reply, sizeof reply, kNetworkAnswerLimitMs));
+    return length == 0 ? -1 : AtFinalResult(reply, length);
 }
 
 }  // namespace vqm

@@ -24,6 +24,11 @@ int QueryCallWaiting(Link& link);
 // caller's "+CCWA: \"<number>\",...") or a status other than 0 and 1 is passed over.
 int ParseCallWaitingReply(const char* reply, int length);
 
+// "AT+CCWA=1": only asks the card to present a waiting caller with a "+CCWA:" line (a standard
+// modem starts with that off), without asking the network anything. The final result code, -1
+// when no reply came.
+int PresentCallWaiting(Link& link);
+
 // "AT+CCWA=1,1,1" (enable != 0) or "AT+CCWA=1,0,1". The final result code, -1 when no reply came.
 int SetCallWaiting(Link& link, int enable);
 

@@ -5,12 +5,14 @@
 #include <QTabBar>
 
 #include "settings/barring_page.h"
+#include "settings/call_waiting_page.h"
 #include "settings/centre_page.h"
 #include "settings/forward_page.h"
 #include "settings/general_page.h"
 #include "settings/modem_page.h"
 #include "settings/network_page.h"
 #include "settings/security_page.h"
+#include "settings/tones_page.h"
 #include "shell/messages.h"
 
 namespace vqm {
@@ -43,8 +45,8 @@ const PageInfo kPages[kSettingsPageCount] = {
     {u"Call Barring", "SETTINGS_CALLBARRING_PAGE", Make<BarringPage>},
     {u"Security", "SETTINGS_SECURITY_PAGE", Make<SecurityPage>},
     {u"Modem", "SETTINGS_MODEM_PAGE", Make<ModemPage>},
-    {u"Call Waiting", "SETTINGS_CALLWAITING_PAGE", Empty},
-    {u"Tones", "SETTINGS_TONES_PAGE", Empty},
+    {u"Call Waiting", "SETTINGS_CALLWAITING_PAGE", Make<CallWaitingPage>},
+    {u"Tones", "SETTINGS_TONES_PAGE", Make<TonesPage>},
 };
 // ---- end of the pages ----
 

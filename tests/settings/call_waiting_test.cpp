@@ -127,6 +127,11 @@ TEST_P(CardCallWaitingTest, QueryEnableAndDisableAnswerAsTheDialectDoes) {
     for (const Step& step : steps)
         EXPECT_EQ(Exchange(step.command), Standard() ? step.standard : step.card) << step.command;
     EXPECT_EQ(group_->Classes(), 0);
+    // Without the service on the subscription every request is refused and changes nothing.
+    EXPECT_EQ(group_->Control("call-waiting", "none"), "OK");
+    for (const char* command : {"AT+CCWA=1,2,1", "AT+CCWA=1,1,1"})
+        EXPECT_EQ(Exchange(command), "\r\n" + notAllowed + "\r\n") << command;
+    EXPECT_EQ(group_->Classes(), 0);
 }
 
 TEST_P(CardCallWaitingTest, ASecondCallerWaitsOnlyWhileWaitingIsOnAndAnnouncedAsTheDialectSays) {
@@ -184,7 +189,7 @@ TEST(CardSimCallWaiting, TheSettingIsKeptAndARingDuringACallWaitsOnlyWhenItIsOn)
     {
         cardsim::CardSim card(config);
         EXPECT_EQ(card.Control("call-waiting"), "OK off");
-        EXPECT_EQ(card.Control("call-waiting maybe"), "ERROR: call-waiting takes on or off");
+        EXPECT_EQ(card.Control("call-waiting maybe"), "ERROR: call-waiting takes on, off or none");
         EXPECT_EQ(card.Control("ring +441234"), "OK");
         EXPECT_EQ(card.Control("local-answer"), "OK");
         EXPECT_EQ(card.Control("ring +445678"), "ERROR: a call is in progress");
@@ -197,6 +202,10 @@ TEST(CardSimCallWaiting, TheSettingIsKeptAndARingDuringACallWaitsOnlyWhenItIsOn)
     // Outside a call a ring is an ordinary ring whatever the setting.
     EXPECT_EQ(again.Control("ring +445678"), "OK");
     EXPECT_NE(again.Control("status").find("call=incoming"), std::string::npos);
+    // Taken off the subscription, the service stays off across a restart.
+    EXPECT_EQ(again.Control("call-waiting none"), "OK");
+    cardsim::CardSim third(config);
+    EXPECT_EQ(third.Control("call-waiting"), "OK none");
 }
 
 }  // namespace
