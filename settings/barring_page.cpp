@@ -129,7 +129,8 @@ BarringPage::BarringPage(QWidget* parent, ShellContext& context)
 BarringPage::~BarringPage() = default;
 
 void BarringPage::BuildSubPage(View* page, int index) {
-    const int width = page->width() > 0 ? page->width() : this->width();
+    // Built before the tab strip places the sub-page, which then spans the page.
+    const int width = this->width();
     const int column = (width - 2 * kMargin) / 2;
     int top = kMargin;
     for (int group = 0; group < 2; ++group) {

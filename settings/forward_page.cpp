@@ -28,7 +28,7 @@ constexpr const char* kClassNames[ForwardPage::kClasses] = {"Voice", "Data", "Fa
 constexpr const char* kPageClasses[ForwardPage::kClasses] = {
     "SETTINGS_CALLFORWARD_VOICE_PAGE", "SETTINGS_CALLFORWARD_DATA_PAGE",
     "SETTINGS_CALLFORWARD_FAX_PAGE"};
-constexpr int kRowHeight = 20, kRowStep = 26, kMargin = 5, kLabelWidth = 88;
+constexpr int kRowHeight = 20, kRowStep = 26, kMargin = 5, kLabelWidth = 100;
 
 QString Q(const std::u16string& text) {
     return QString::fromStdU16String(text);
@@ -177,7 +177,8 @@ ForwardPage::ForwardPage(QWidget* parent, ShellContext& context)
 ForwardPage::~ForwardPage() = default;
 
 void ForwardPage::BuildSubPage(View* page, int index) {
-    const int width = page->width() > 0 ? page->width() : this->width();
+    // Built before the tab strip places the sub-page, which then spans the page.
+    const int width = this->width();
     const int editLeft = kMargin + kLabelWidth;
     const int buttonLeft = width - kMargin - kRowHeight;
     for (int reason = 0; reason < 4; ++reason) {
