@@ -410,16 +410,23 @@ void ManageContactsView::Do(unsigned work) {
     if (work & kWorkLearnGeometry) LearnGeometry();
 }
 
+int ManageContactsView::OnCard(const std::function<int()>& work) {
+    return context_.mainWindow ? context_.mainWindow->RunAside(work) : work();
+}
+
 void ManageContactsView::LearnGeometry() {
     const struct {
         int storage;
         const char* prefix;
     } books[2] = {{kStorageCardPhone, "me"}, {kStorageSimCard, "sm"}};
     for (const auto& book : books) {
-        if (PhonebookSelect(context_.link, book.storage) != 0) continue;
         int32_t number = 0, text = 0, total = 0;
-        PhonebookGetGeometry(context_.link, &number, &text, &total);
-        PhonebookSaveGeometry(context_.settings, book.prefix, number, text, total);
+        const int selected = OnCard([&] {
+            if (PhonebookSelect(context_.link, book.storage) != 0) return 0;
+            PhonebookGetGeometry(context_.link, &number, &text, &total);
+            return 1;
+        });
+        if (selected) PhonebookSaveGeometry(context_.settings, book.prefix, number, text, total);
     }
 }
 
@@ -639,7 +646,7 @@ void ManageContactsView::NewContact(int page) {
     if (!RunContactDialog(dialog, limits)) return;
     const PhonebookEntry entry =
         MakeEntry(index, U(dialog.Name()->text()), U(dialog.Number()->text()));
-    if (PhonebookWriteEntry(context_.link, code.c_str(), entry) != 0) {
+    if (OnCard([&] { return PhonebookWriteEntry(context_.link, code.c_str(), entry); }) != 0) {
         Box(u"Cannot write phonebook entry.");
         return;
     }
@@ -660,7 +667,7 @@ void ManageContactsView::EditContact(int page) {
     if (!RunContactDialog(dialog, limits)) return;
     const PhonebookEntry entry =
         MakeEntry(row.index, U(dialog.Name()->text()), U(dialog.Number()->text()));
-    if (PhonebookWriteEntry(context_.link, code.c_str(), entry) != 0) {
+    if (OnCard([&] { return PhonebookWriteEntry(context_.link, code.c_str(), entry); }) != 0) {
         Box(u"Cannot write phonebook entry.");
         return;
     }
@@ -701,7 +708,7 @@ void ManageContactsView::CopyRows(const std::vector<Row>& rows, const std::strin
             number = U(dialog.Number()->text());
         }
         const PhonebookEntry entry = MakeEntry(index, name, number);
-        if (PhonebookWriteEntry(context_.link, target.c_str(), entry) != 0) {
+        if (OnCard([&] { return PhonebookWriteEntry(context_.link, target.c_str(), entry); }) != 0) {
             Box(u"Cannot write phonebook entry.");
             break;
         }
@@ -711,11 +718,14 @@ void ManageContactsView::CopyRows(const std::vector<Row>& rows, const std::strin
 }
 
 void ManageContactsView::DeleteContacts(int page) {
+    // The rows are read first: the list may be filled again while the card works.
+    std::vector<Row> rows;
+    for (QTreeWidgetItem* item : ChosenRows(page))
+        rows.push_back(RowOf(item));
     std::string last;
-    for (QTreeWidgetItem* item : ChosenRows(page)) {
-        const Row row = RowOf(item);
+    for (const Row& row : rows) {
         const std::string code = Utf16ToUtf8(row.storage);
-        if (!PhonebookDeleteEntry(context_.link, code.c_str(), row.index)) {
+        if (!OnCard([&] { return PhonebookDeleteEntry(context_.link, code.c_str(), row.index); })) {
             Box(u"Cannot delete phonebook entry.");
             break;
         }

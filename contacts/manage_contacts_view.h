@@ -127,6 +127,8 @@ class ManageContactsView : public View {
     void EmptyList(int page);
     void LearnGeometry();
     std::vector<QTreeWidgetItem*> ChosenRows(int page) const;
+    // An exchange with the card, run aside so the window keeps painting and taking rings.
+    int OnCard(const std::function<int()>& work);
     Row RowOf(QTreeWidgetItem* item) const;
     int Box(const std::u16string& text);
     // Runs a contact dialog until its fields pass the check against limits, or it is cancelled.

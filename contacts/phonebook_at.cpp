@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "link/link.h"
+#include "support/field_cursor.h"
 #include "support/settings_store.h"
 #include "support/text.h"
 
@@ -42,60 +43,43 @@ int PhonebookStorageIndex(const char* code) {
 
 int PhonebookParseEntryLine(const char* text, const char* end, PhonebookEntry* entry) {
     if (!text || !end || !entry) return 0;
-    const char* p = text;
-    // Cards put a blank after the tag; ParseInt itself wants the digit first.
-    while (p < end && *p == ' ')
-        ++p;
+    FieldCursor c(text, end);
     int32_t value = 0;
-    p = ParseInt(p, end, &value);
-    if (!p) return 0;
+    if (!c.NextInt(&value)) return 0;
     entry->index = value;
-    if (p >= end || *p != ',') return 0;
     int length = 0;
-    p = ParseQuoted(p + 1, end, entry->number, sizeof entry->number, &length);
-    if (!p) return 0;
+    if (!c.Comma() || !c.SeekQuoted(entry->number, sizeof entry->number, &length)) return 0;
     entry->numberLength = length;
-    if (p >= end || *p != ',') return 0;
-    p = ParseInt(p + 1, end, &value);
-    if (!p) return 0;
+    if (!c.Comma() || !c.NextInt(&value)) return 0;
     entry->type = value;
-    if (p >= end || *p != ',') return 0;
-    p = ParseQuoted(p + 1, end, entry->text, sizeof entry->text, &length);
-    if (!p) return 0;
+    if (!c.Comma() || !c.SeekQuoted(entry->text, sizeof entry->text, &length)) return 0;
     entry->textLength = length;
     return 1;
 }
 
 int PhonebookParseRange(const char* reply, int length, PhonebookEntry* entries, int64_t count) {
     if (!reply || !entries || length <= 0) return 0;
-    const char* end = reply + length;
-    int position = 0, found = 0;
-    for (int64_t slot = 0; slot < count; ++slot) {
-        const int at = FindPattern(position, "+CPBR:", 6, reply, length);
-        // Once no tag is left none will be found for later slots either: they stay as they were.
-        if (at < 0) break;
-        position = at + 6;
-        PhonebookParseEntryLine(reply + position, end, &entries[slot]);
+    // Entry lines only: a name that holds "+CPBR:" is no entry of its own.
+    FieldCursor c(reply, length);
+    int found = 0;
+    for (int64_t slot = 0; slot < count && c.NextTag("+CPBR:"); ++slot) {
+        PhonebookParseEntryLine(c.Position(), c.End(), &entries[slot]);
         ++found;
     }
+    // Once no tag is left none will be found for later slots either: they stay as they were.
     return found;
 }
 
 int PhonebookParseUsage(const char* reply, int length, int32_t* used, int32_t* total) {
     if (!reply || length <= 0) return 0;
-    const int at = FindPattern(0, "+CPBS:", 6, reply, length);
-    if (at < 0) return 0;
-    const char* end = reply + length;
+    FieldCursor c(reply, length);
     char name[8];
-    const char* p = ParseQuoted(reply + at + 6, end, name, sizeof name, nullptr);
-    if (!p || p >= end || *p != ',') return 0;
     int32_t value = 0;
-    p = ParseInt(p + 1, end, &value);
-    if (!p) return 0;
+    if (!c.NextTag("+CPBS:") || !c.SeekQuoted(name, sizeof name, nullptr) || !c.Comma() ||
+        !c.NextInt(&value))
+        return 0;
     if (used) *used = value;
-    if (p >= end || *p != ',') return 0;
-    p = ParseInt(p + 1, end, &value);
-    if (!p) return 0;
+    if (!c.Comma() || !c.NextInt(&value)) return 0;
     if (total) *total = value;
     return 1;
 }
@@ -103,15 +87,12 @@ int PhonebookParseUsage(const char* reply, int length, int32_t* used, int32_t* t
 void PhonebookParseGeometry(const char* reply, int length, int32_t* numberLength,
                             int32_t* textLength, int32_t* highestIndex) {
     if (!reply || length <= 0) return;
-    const char* end = reply + length;
     // Only a range that starts at 1 gives the highest index; (0-99) leaves it at 0.
-    const int range = FindPattern(0, "(1-", 3, reply, length);
-    if (range >= 0) ParseInt(reply + range + 3, end, highestIndex);
-    const int close = FindPattern(0, "),", 2, reply, length);
-    if (close > 0) {
-        const char* p = ParseInt(reply + close + 2, end, numberLength);
-        if (p && p < end && *p == ',') ParseInt(p + 1, end, textLength);
-    }
+    FieldCursor range(reply, length);
+    if (range.SeekPast("(1-")) range.NextInt(highestIndex);
+    FieldCursor lengths(reply, length);
+    if (lengths.SeekPast("),") && lengths.NextInt(numberLength) && lengths.Comma())
+        lengths.NextInt(textLength);
 }
 
 int PhonebookSelect(Link& link, int storage) {
@@ -149,9 +130,8 @@ int PhonebookReadEntry(Link& link, int index, PhonebookEntry* entry) {
     char reply[kPhonebookReplySize];
     const int length = Exchange(link, command, reply, sizeof reply);
     if (length == 0) return 0;
-    const int at = FindPattern(0, "+CPBR:", 6, reply, length);
-    if (at < 0) return 0;
-    return PhonebookParseEntryLine(reply + at + 6, reply + length, entry);
+    FieldCursor c(reply, length);
+    return c.NextTag("+CPBR:") ? PhonebookParseEntryLine(c.Position(), c.End(), entry) : 0;
 }
 
 int PhonebookReadRange(Link& link, int first, int last, PhonebookEntry* entries) {

@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "link/link.h"
+#include "support/field_cursor.h"
 #include "support/gsm.h"
 #include "support/text.h"
 
@@ -27,18 +28,6 @@ int Exchange(Link& link, const char* command, char* reply, size_t replySize) {
 }
 
 // Cards put a blank behind the colon of a reply tag; the fields start after it.
-const char* SkipBlanks(const char* p, const char* end) {
-    while (p < end && *p == ' ')
-        ++p;
-    return p;
-}
-
-// The field position behind a 6-character reply tag, or nullptr when the tag is absent.
-const char* AfterTag(const char* tag, const char* reply, int length) {
-    const int at = FindPattern(0, tag, 6, reply, length);
-    return at < 0 ? nullptr : SkipBlanks(reply + at + 6, reply + length);
-}
-
 bool HasError(const char* reply, int length) {
     return FindPattern(0, "ERROR", 5, reply, length) >= 0;
 }
@@ -110,9 +99,9 @@ int SendTextWithPrompt(Link& link, const char* command, SmsRecord* record, char*
 void AfterWrite(SmsRecord* record, const char* reply, int length) {
     CopyBounded(record->status, sizeof record->status, "STO UNSENT");
     record->date[0] = '\0';
-    const char* p = AfterTag("+CMGW:", reply, length);
+    FieldCursor c(reply, length);
     int32_t index;
-    if (p && ParseInt(p, reply + length, &index)) record->index = index;
+    if (c.NextTag("+CMGW:") && c.NextInt(&index)) record->index = index;
 }
 
 // "yy/MM/dd,hh:mm:ss+zz" as hh:mm:ss,dd/MM/20yy; a field of another shape stays as it came.
@@ -130,27 +119,24 @@ int SmsGetCentre(Link& link, char16_t* centre, size_t centreSize, int32_t* valid
     char reply[kReplySize];
     int length = Exchange(link, "AT+CSCA?\r", reply, sizeof reply);
     if (length == 0) return 0;
-    if (const char* p = AfterTag("+CSCA:", reply, length); p && centre && centreSize > 0) {
+    if (FieldCursor c(reply, length); c.NextTag("+CSCA:") && centre && centreSize > 0) {
         char number[64];
         int numberLength = 0;
-        if (ParseQuoted(p, reply + length, number, sizeof number, &numberLength) &&
-            numberLength >= 1)
+        if (c.SeekQuoted(number, sizeof number, &numberLength) && numberLength >= 1)
             NarrowToWide(number, centre, numberLength, centreSize);
         else
             centre[0] = u'\0';
     }
     length = Exchange(link, "AT+CSMP?\r", reply, sizeof reply);
     if (length == 0) return 0;
-    const char* p = AfterTag("+CSMP:", reply, length);
-    if (!p || !validity) return 1;
+    FieldCursor c(reply, length);
+    if (!c.NextTag("+CSMP:") || !validity) return 1;
     // <fo> and <vp> land in the one output on purpose: only <vp> is wanted.
-    const char* end = reply + length;
-    const char* after = ParseInt(p, end, validity);
-    if (!after || after >= end || *after != ',') {
+    if (!c.NextInt(validity) || !c.Comma()) {
         *validity = 0;
         return 1;
     }
-    ParseInt(after + 1, end, validity);
+    c.NextInt(validity);
     return 1;
 }
 
@@ -172,11 +158,10 @@ int SmsSelectSimStorage(Link& link, int32_t* used, int32_t* total) {
     char reply[kReplySize];
     const int length = Exchange(link, "AT+CPMS=\"SM\",\"SM\",\"SM\"\r", reply, sizeof reply);
     if (length == 0) return 0;
-    const char* end = reply + length;
-    const char* p = AfterTag("+CPMS:", reply, length);
+    FieldCursor c(reply, length);
     int32_t ignored;
-    if (!p || !(p = ParseInt(p, end, used ? used : &ignored)) || p >= end || *p != ',') return 0;
-    return ParseInt(p + 1, end, total ? total : &ignored) ? 1 : 0;
+    if (!c.NextTag("+CPMS:") || !c.NextInt(used ? used : &ignored) || !c.Comma()) return 0;
+    return c.NextInt(total ? total : &ignored);
 }
 
 int SmsStorageUsed(Link& link) {
@@ -295,17 +280,16 @@ int ParseAfterAddress(const char* pdu, const char* pduEnd, long at, int firstOct
 int SmsParsePduReply(const char* reply, int length, SmsRecord* record) {
     if (!reply || length <= 0 || !record) return 0;
     const char* end = reply + length;
-    const char* p = AfterTag("+CMGR:", reply, length);
-    if (!p) return 0;
+    FieldCursor c(reply, length);
+    if (!c.NextTag("+CMGR:")) return 0;
     int32_t stat = -1;
-    p = ParseInt(p, end, &stat);
-    if (p) CopyBounded(record->status, sizeof record->status, StatusWord(stat));
-    if (!p || p >= end || *p != ',') return 0;
-    ++p;
-    if (p < end && *p == ',') ++p;  // empty alpha field
+    const bool statRead = c.NextInt(&stat);
+    if (statRead) CopyBounded(record->status, sizeof record->status, StatusWord(stat));
+    if (!statRead || !c.Comma()) return 0;
+    c.Comma();  // empty alpha field
     int32_t pduLength;
-    if (!(p = ParseInt(p, end, &pduLength))) return 0;
-    const char* pdu = p + 2;  // behind the "\r\n" that ends the header line
+    if (!c.NextInt(&pduLength)) return 0;
+    const char* pdu = c.Position() + 2;  // behind the "\r\n" that ends the header line
     if (pdu > end) return 0;
     // The PDU, and with it every field below, ends at the first line end.
     const char* pduEnd = pdu;
@@ -364,20 +348,16 @@ int SmsParsePduReply(const char* reply, int length, SmsRecord* record) {
 
 int SmsParseTextReply(const char* reply, int length, SmsRecord* record) {
     if (!reply || length <= 0 || !record) return 0;
-    const char* end = reply + length;
-    const int tag = FindPattern(0, "+CMGR:", 6, reply, length);
-    if (tag < 0) return 0;
-    const char* p = reply + tag + 6;
-    if (!(p = ParseQuoted(p, end, record->status, sizeof record->status, nullptr))) return 0;
-    if (p >= end || *p != ',') return 0;
-    if (!(p = ParseQuoted(p + 1, end, record->number, sizeof record->number, nullptr))) return 0;
-    if (p >= end || *p != ',') return 0;
-    ++p;
-    if (p < end && *p == ',') {
-        if (!(p = ParseQuoted(p + 1, end, record->date, sizeof record->date, nullptr))) return 0;
+    FieldCursor c(reply, length);
+    if (!c.NextTag("+CMGR:") || !c.SeekQuoted(record->status, sizeof record->status, nullptr) ||
+        !c.Comma() || !c.SeekQuoted(record->number, sizeof record->number, nullptr) || !c.Comma())
+        return 0;
+    // Behind an empty alpha field, the time stamp.
+    if (c.Comma()) {
+        if (!c.SeekQuoted(record->date, sizeof record->date, nullptr)) return 0;
         ReorderTextDate(record->date, sizeof record->date);
     }
-    const long bodyAt = (p - reply) + 2;
+    const long bodyAt = (c.Position() - reply) + 2;
     const int okAt = FindPattern(0, "\r\nOK\r\n", 6, reply, length);
     if (okAt < 1) return 0;
     long count = okAt - bodyAt;
@@ -453,9 +433,9 @@ int SmsGetFormat(Link& link) {
     char reply[kReplySize];
     const int length = Exchange(link, "AT+CMGF?\r", reply, sizeof reply);
     if (length == 0) return -1;
-    const char* p = AfterTag("+CMGF:", reply, length);
+    FieldCursor c(reply, length);
     int32_t mode;
-    return p && ParseInt(p, reply + length, &mode) ? mode : -1;
+    return c.NextTag("+CMGF:") && c.NextInt(&mode) ? mode : -1;
 }
 
 int SmsSetFormat(Link& link, int mode) {

@@ -9,6 +9,7 @@
 #include <QTextEdit>
 #include <QTreeWidget>
 #include <algorithm>
+#include <atomic>
 #include <cstdio>
 
 #include "contacts/manage_contacts.h"
@@ -320,15 +321,36 @@ void SmsFolderView::SelectPage(int page) {
     SwitchView(pages_, page);
 }
 
+namespace {
+// A box asked for by work that runs aside: shown on the window's thread while the work waits.
+constexpr unsigned kMsgFolderBox = 1325;
+struct BoxRequest {
+    std::u16string text, title;
+};
+}  // namespace
+
 FolderUi SmsFolderView::Ui() {
     FolderUi ui;
     ui.box = [this](const std::u16string& text, const std::u16string& title) {
-        const unsigned icon = title == u"VQM Dialer" ? kMbIconInformation : kMbIconExclamation;
-        context_.dialogs.MessageBox(this, text, title, kMbOk | icon | kMbTopmost);
+        BoxRequest request{text, title};
+        if (context_.messages && !context_.messages->OnOwnerThread()) {
+            context_.messages->Send(this, kMsgFolderBox, reinterpret_cast<long>(&request), 0);
+            return;
+        }
+        ShowBox(request.text, request.title);
     };
     ui.beginBusy = [this] { BeginBusy(); };
     ui.endBusy = [this] { EndBusy(); };
     return ui;
+}
+
+void SmsFolderView::ShowBox(const std::u16string& text, const std::u16string& title) {
+    const unsigned icon = title == u"VQM Dialer" ? kMbIconInformation : kMbIconExclamation;
+    context_.dialogs.MessageBox(this, text, title, kMbOk | icon | kMbTopmost);
+}
+
+int SmsFolderView::OnCard(const std::function<int()>& work) {
+    return context_.mainWindow ? context_.mainWindow->RunAside(work) : work();
 }
 
 void SmsFolderView::BeginBusy() {
@@ -340,7 +362,9 @@ void SmsFolderView::EndBusy() {
 }
 
 void SmsFolderView::Paste() {
-    PasteIntoPage(store_, context_.link, pages_.current, Ui());
+    const FolderUi ui = Ui();
+    const int page = pages_.current;
+    OnCard([&] { return PasteIntoPage(store_, context_.link, page, ui); });
     Reload();
 }
 
@@ -362,9 +386,13 @@ void SmsFolderView::Forward() {
 void SmsFolderView::DeleteSelected() {
     const std::vector<FolderRow> rows = SelectedRows(pages_.current);
     if (rows.empty()) return;
-    DeleteMessages(store_, context_.link, rows, Ui(), [this] {
-        if (hooks_.simFullAlert) hooks_.simFullAlert(0);
+    const FolderUi ui = Ui();
+    std::atomic<bool> simFullCleared{false};
+    OnCard([&] {
+        return DeleteMessages(store_, context_.link, rows, ui, [&] { simFullCleared = true; });
     });
+    // The DialPad's notice is the window's: cleared here, once the card has room again.
+    if (simFullCleared && hooks_.simFullAlert) hooks_.simFullAlert(0);
     Reload();
 }
 
@@ -372,7 +400,8 @@ void SmsFolderView::SendSelected() {
     const FolderRow* row = CurrentRow(pages_.current);
     if (!row) return;
     const FolderRow chosen = *row;
-    SendStoredMessage(store_, context_.link, chosen, Ui());
+    const FolderUi ui = Ui();
+    OnCard([&] { return SendStoredMessage(store_, context_.link, chosen, ui); });
     Reload();
 }
 
@@ -425,12 +454,13 @@ void SmsFolderView::OnCardState() {
         OnMessage(kMsgViewShown, 0, 0);
     } else if (IndexListCount(context_.settings, kNewIdx) > 0) {
         if (context_.mainWindow) context_.mainWindow->Command(kCmdViewFirst + kViewSmsFolder);
-    } else if (SmsStorageFull(context_.link) == 1 && hooks_.simFullAlert) {
+    } else if (OnCard([this] { return SmsStorageFull(context_.link); }) == 1 &&
+               hooks_.simFullAlert) {
         hooks_.simFullAlert(1);
     }
 }
 
-long SmsFolderView::OnMessage(unsigned msg, long, long) {
+long SmsFolderView::OnMessage(unsigned msg, long wParam, long) {
     switch (msg) {
         case kMsgViewShown:
             if (cardState_() == 1) {
@@ -439,7 +469,7 @@ long SmsFolderView::OnMessage(unsigned msg, long, long) {
                 StartRefresh();
             } else if (refreshState_ == kFolderRefreshed &&
                        IndexListCount(context_.settings, kNewIdx) > 0) {
-                SmsIntakeNew(store_, context_.link);
+                OnCard([this] { return SmsIntakeNew(store_, context_.link); });
             }
             break;
         case kMsgSimRefreshDone:
@@ -448,6 +478,11 @@ long SmsFolderView::OnMessage(unsigned msg, long, long) {
         case kMsgCardStateChanged:
             OnCardState();
             break;
+        case kMsgFolderBox: {
+            const auto* request = reinterpret_cast<const BoxRequest*>(wParam);
+            ShowBox(request->text, request->title);
+            break;
+        }
         case kMsgRefreshLists:
         case kMsgSimCacheBuilt:
         case kMsgOutlookCacheBuilt:

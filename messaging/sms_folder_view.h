@@ -88,6 +88,9 @@ class SmsFolderView : public View {
     const FolderRow* CurrentRow(int page) const;
     std::vector<FolderRow> SelectedRows(int page) const;
     FolderUi Ui();
+    void ShowBox(const std::u16string& text, const std::u16string& title);
+    // An exchange with the card, run aside so the window keeps painting and taking rings.
+    int OnCard(const std::function<int()>& work);
     void BeginBusy();
     void EndBusy();
     void OnCardState();

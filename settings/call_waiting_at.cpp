@@ -51,7 +51,8 @@ int ParseCallWaitingLine(const char* text, int length, char* number, size_t numb
 
 int QueryCallWaiting(Link& link) {
     char reply[256];
-    const int length = static_cast<int>(AtCommand(link, "AT+CCWA=1,2,1\r", reply, sizeof reply));
+    const int length = static_cast<int>(
+        AtCommandWithin(link, "AT+CCWA=1,2,1\r", reply, sizeof reply, kNetworkAnswerLimitMs));
     if (length == 0) return kWaitingUnknown;
     return ParseCallWaitingReply(reply, length);
 }

@@ -415,6 +415,7 @@ int MainWindow::RunAside(const std::function<int()>& work) {
     QEventLoop loop;
     std::atomic<bool> done{false};
     int result = 0;
+    busy_.BeginBusy();
     std::thread helper([&] {
         result = work();
         done = true;
@@ -423,6 +424,7 @@ int MainWindow::RunAside(const std::function<int()>& work) {
     // An exit meanwhile ends the loop early; the work is bounded and is waited for all the same.
     if (!done.load()) loop.exec(QEventLoop::ExcludeUserInputEvents);
     helper.join();
+    busy_.EndBusy();
     return result;
 }
 
