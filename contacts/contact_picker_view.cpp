@@ -1,5 +1,6 @@
 #include "contacts/contact_picker_view.h"
 
+#include <QApplication>
 #include <QHeaderView>
 #include <QMenu>
 #include <QMetaObject>
@@ -90,36 +91,28 @@ ContactPickerView::ContactPickerView(QWidget* parent, ShellContext& context,
     SetControlId(cancel_, kPickerCancelId);
     QObject::connect(cancel_, &QPushButton::clicked, this, [this] { Cancel(); });
     Relayout();
-    Messages();  // made on the view's thread, which owns it
+    // The builders report through a layer of the view's own, made on the view's thread, which
+    // owns it. Each report holds the layer, so a builder that ends after the view is gone finds
+    // it closed and goes on; the view never waits for the shared builder threads, one of which
+    // may be waiting for another view's window.
+    auto slot = std::make_shared<std::weak_ptr<MessageLayer>>();
+    messages_ = std::make_shared<MessageLayer>([slot] {
+        QMetaObject::invokeMethod(
+            qApp,
+            [slot] {
+                if (std::shared_ptr<MessageLayer> layer = slot->lock()) layer->DeliverPending();
+            },
+            Qt::QueuedConnection);
+    });
+    *slot = messages_;
 }
 
 ContactPickerView::~ContactPickerView() {
-    // Reports still on their way are refused from here on; then the builders are joined, so
-    // none of them is left holding this view's layer.
-    Messages().Close();
-    caches_->workers.JoinAll();
-}
-
-// The builders report through a layer of the view's own, which lives exactly as long as it.
-MessageLayer& ContactPickerView::Messages() {
-    if (!ownMessages_)
-        ownMessages_ = std::make_unique<MessageLayer>([this] {
-            QMetaObject::invokeMethod(
-                this, [this] { ownMessages_->DeliverPending(); }, Qt::QueuedConnection);
-        });
-    return *ownMessages_;
+    messages_->Close();  // reports still on their way are refused from here on
 }
 
 CacheNotify ContactPickerView::Notifier() {
-    MessageLayer* messages = &Messages();
-    return [this, messages](unsigned msg) { messages->Send(this, msg, 0, 0); };
-}
-
-void ContactPickerView::WaitForBuilders() {
-    MessageLayer& messages = Messages();
-    caches_->workers.JoinAll(
-        [&messages](const std::function<bool()>& done) { messages.WaitWhileDelivering(done); });
-    messages.DeliverPending();
+    return [this, layer = messages_](unsigned msg) { layer->Send(this, msg, 0, 0); };
 }
 
 QTreeWidget* ContactPickerView::MakeList(QWidget* page, int index) {

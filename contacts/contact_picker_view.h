@@ -51,8 +51,6 @@ class ContactPickerView : public View {
     QMenu* PrepareMenu(int page, QPoint pos);
     void Ok();
     void Cancel();
-    // Waits for the cache work the picker started, delivering its reports meanwhile.
-    void WaitForBuilders();
 
     const PickerLoadState& LoadState() const { return state_; }
     void SetCardStateSource(std::function<int()> source) { cardState_ = std::move(source); }
@@ -64,13 +62,12 @@ class ContactPickerView : public View {
     QTreeWidget* MakeList(QWidget* page, int index);
     void Relayout();
     void Do(unsigned work);
-    MessageLayer& Messages();
     CacheNotify Notifier();
 
     ShellContext& context_;
     std::unique_ptr<PhonebookCaches> ownCaches_;
     PhonebookCaches* caches_;
-    std::unique_ptr<MessageLayer> ownMessages_;
+    std::shared_ptr<MessageLayer> messages_;
     PickerHooks hooks_;
     std::function<int()> cardState_;
     PickerLoadState state_;

@@ -39,6 +39,11 @@ class WriteSmsViewTest : public ::testing::TestWithParam<cardsim::Dialect> {
     WriteSmsViewTest() {
         SetSettingString(settings_, u"InstallPath", Utf8ToUtf16(install_).c_str());
         std::filesystem::create_directories(install_);
+        // On its very first run the Settings view gives the card the SIM-default centre, an
+        // empty number, which leaves the simulated card nothing to send through: these tests
+        // start as a dialer that has run before.
+        const int32_t simDefault = 1;
+        SetSettingInt(settings_, u"SettingsMessagesUseSIMDefault", &simDefault);
         dialogs_.SetResponder([this](const DialogRequest& request) {
             boxes_.push_back(Utf16ToUtf8(request.title + u": " + request.text));
             return answer_;
@@ -261,7 +266,6 @@ TEST_P(WriteSmsViewTest, PickerAddsTickedContactsAndKeepsWhatWasTyped) {
     Click(picker_, kPickerOkId);
     EXPECT_EQ(write_->Recipients(), u"555;\nAlice<+447700900123>;\nBob<+447700900456>;\n");
     EXPECT_EQ(write_->Text(), u"typed");
-    picker_->WaitForBuilders();
 }
 
 TEST_P(WriteSmsViewTest, RequestsFromOtherViewsLandInTheFields) {
