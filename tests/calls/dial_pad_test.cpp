@@ -21,6 +21,7 @@
 #include "support/settings_store.h"
 #include "support/text.h"
 #include "tests/common/temp_folder.h"
+#include "tests/common/wait.h"
 
 namespace vqm {
 namespace {
@@ -89,10 +90,15 @@ class DialExchangeTest : public ::testing::Test {
     std::thread Start(const char* number) {
         return std::thread([this, number] { result_ = DialExchange(link_, number, cancel_); });
     }
-    // The dial is under way once the dial thread owns the port.
-    void WaitUntilDialling() {
-        while (sim_->Control("status").find("call=dialing") == std::string::npos)
-            std::this_thread::sleep_for(milliseconds(20));
+    // The dial is under way once the card reports it; false if that does not come.
+    bool Dialling() {
+        return testing::WaitFor(
+            [&] { return sim_->Control("status").find("call=dialing") != std::string::npos; },
+            milliseconds(10000));
+    }
+    // The listener's poll, queued behind a dial, may hold the port for a moment.
+    bool PortGivenBack() {
+        return testing::WaitFor([&] { return link_.portState.load() == 1; }, milliseconds(3000));
     }
 
     const testing::TempFolder temp_;
@@ -115,25 +121,20 @@ TEST_F(DialExchangeTest, ResultsOfTheNetworkAreSearchedOnlyWithinTheCommandsLeng
     // "ATD1;\r" is six bytes: "\r\nBUSY\r" does not fit in them, so no result is found.
     ASSERT_EQ(sim_->Control("busy 1"), "OK");
     EXPECT_EQ(DialExchange(link_, "1", cancel_), -1);
-    // The port is free again after every exchange (the listener's poll, queued behind the
-    // dials, may hold it for a moment).
-    for (int i = 0; i < 300 && link_.portState.load() != 1; ++i)
-        std::this_thread::sleep_for(milliseconds(10));
-    EXPECT_EQ(link_.portState.load(), 1);
+    // The port is free again after every exchange.
+    EXPECT_TRUE(PortGivenBack());
 }
 
 TEST_F(DialExchangeTest, CancelEndsTheWaitOnNewFirmwareAndIsClearedAfterwards) {
     Open("SW4.00", 600000);
     std::thread dial = Start("0123456");
-    WaitUntilDialling();
+    const bool dialling = Dialling();
     cancel_.store(1);
     dial.join();
+    ASSERT_TRUE(dialling);
     EXPECT_EQ(result_.load(), -1);
     EXPECT_EQ(cancel_.load(), 0);
-    // Given back: the listener's poll, queued behind the dial, may hold it for a moment.
-    for (int i = 0; i < 300 && link_.portState.load() != 1; ++i)
-        std::this_thread::sleep_for(milliseconds(10));
-    EXPECT_EQ(link_.portState.load(), 1);
+    EXPECT_TRUE(PortGivenBack());
 
     // A cancel raised before the exchange starts is taken at once and cleared too.
     cancel_.store(1);
@@ -144,12 +145,15 @@ TEST_F(DialExchangeTest, CancelEndsTheWaitOnNewFirmwareAndIsClearedAfterwards) {
 TEST_F(DialExchangeTest, OldFirmwareWaitsForTheCardsAnswerDespiteACancel) {
     Open("SW3.80", 600000);
     std::thread dial = Start("0123456");
-    WaitUntilDialling();
+    const bool dialling = Dialling();
     cancel_.store(1);
-    std::this_thread::sleep_for(milliseconds(400));
-    EXPECT_EQ(result_.load(), -2);  // still waiting
-    ASSERT_EQ(sim_->Control("remote-answer"), "OK");
+    // Still waiting: the dial does not end within 400 ms of the cancel.
+    const bool endedEarly = testing::WaitFor([&] { return result_.load() != -2; }, milliseconds(400));
+    const std::string answered = sim_->Control("remote-answer");
     dial.join();
+    ASSERT_TRUE(dialling);
+    EXPECT_FALSE(endedEarly);
+    ASSERT_EQ(answered, "OK");
     // The cancel noticed after the answer still turns the outcome into a failure.
     EXPECT_EQ(result_.load(), -1);
     EXPECT_EQ(cancel_.load(), 0);

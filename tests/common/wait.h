@@ -1,11 +1,15 @@
 // The one way tests wait for something to happen: poll a condition until it holds or the time
 // is up. Every wait is bounded; the caller asserts on the result, so a fault fails the test
-// instead of hanging it. A test with a Qt event loop passes a condition that also runs the
-// loop (see PumpingFor).
+// instead of hanging it. A test with a Qt event loop waits with WaitPumping, which keeps the
+// loop running meanwhile (built only where Qt is linked, so the Qt-less tests share this header).
 #pragma once
 
 #include <chrono>
 #include <thread>
+
+#if defined(QT_CORE_LIB)
+#include <QCoreApplication>
+#endif
 
 namespace vqm::testing {
 
@@ -20,9 +24,7 @@ bool WaitFor(Condition condition,
     return true;
 }
 
-// The condition with an event-loop step before each look: pump is the loop's step, e.g.
-// [] { QCoreApplication::processEvents(QEventLoop::AllEvents, 20); }. Kept free of Qt so the
-// Qt-less tests share this header.
+// The condition with an event-loop step before each look.
 template <typename Pump, typename Condition>
 auto PumpingFor(Pump pump, Condition condition) {
     return [pump, condition]() mutable {
@@ -30,5 +32,17 @@ auto PumpingFor(Pump pump, Condition condition) {
         return condition();
     };
 }
+
+#if defined(QT_CORE_LIB)
+// WaitFor while the window keeps taking its events (a worker's sends, timers, repaints).
+template <typename Condition>
+bool WaitPumping(Condition condition,
+                 std::chrono::milliseconds limit = std::chrono::milliseconds(20000)) {
+    return WaitFor(
+        PumpingFor([] { QCoreApplication::processEvents(QEventLoop::AllEvents, 20); },
+                   condition),
+        limit);
+}
+#endif
 
 }  // namespace vqm::testing

@@ -30,6 +30,7 @@
 #include "support/text.h"
 #include "tests/common/sim_card_host.h"
 #include "tests/common/temp_folder.h"
+#include "tests/common/wait.h"
 
 namespace vqm {
 namespace {
@@ -37,13 +38,7 @@ namespace {
 using testing::SimCardHost;
 
 bool WaitFor(const std::function<bool()>& done) {
-    const auto until = std::chrono::steady_clock::now() + std::chrono::seconds(30);
-    while (!done()) {
-        if (std::chrono::steady_clock::now() > until) return false;
-        QApplication::processEvents(QEventLoop::AllEvents, 20);
-        std::this_thread::sleep_for(std::chrono::milliseconds(5));
-    }
-    return true;
+    return testing::WaitPumping(done, std::chrono::seconds(30));
 }
 
 TEST(ContactsInWindowTest, ANewContactsCallRingsWithItsName) {

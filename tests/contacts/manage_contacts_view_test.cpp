@@ -31,6 +31,7 @@
 #include "support/settings_store.h"
 #include "support/text.h"
 #include "tests/common/temp_folder.h"
+#include "tests/common/wait.h"
 
 namespace vqm {
 namespace {
@@ -98,12 +99,7 @@ class ManageContactsViewTest : public ::testing::Test {
         return view;
     }
     static bool WaitUntil(const std::function<bool()>& done) {
-        const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
-        while (!done()) {
-            if (std::chrono::steady_clock::now() > deadline) return false;
-            QApplication::processEvents(QEventLoop::AllEvents, 20);
-        }
-        return true;
+        return testing::WaitPumping(done, std::chrono::seconds(30));
     }
     // The next dialog is answered by filling its fields and pressing OK (or Cancel).
     void Fill(const QString& name, const QString& number, int answer = kIdOk) {

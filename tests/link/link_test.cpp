@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <chrono>
 #include <cstring>
 #include <filesystem>
@@ -16,6 +17,7 @@
 #include "link/operators.h"
 #include "support/settings_store.h"
 #include "tests/common/temp_folder.h"
+#include "tests/common/wait.h"
 
 namespace vqm {
 namespace {
@@ -252,8 +254,7 @@ TEST_F(LinkTest, RingDuringACommandIsHandledOnceAfterThePortIsFree) {
         std::lock_guard<std::recursive_mutex> lock(sink_.mutex);
         return sink_.handledOn.size();
     };
-    for (int i = 0; i < 300 && handled() < 1; ++i)
-        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    EXPECT_TRUE(testing::WaitFor([&] { return handled() >= 1; }));
     PortClose(*link);
     ASSERT_EQ(sink_.queued.size(), 1u);
     ASSERT_EQ(sink_.handledOn.size(), 1u);
@@ -309,8 +310,9 @@ TEST_F(LinkTest, SilentCardWaitsUntilThePortCloses) {
         char reply[256];
         result = AtCommand(*link, "AT+SILENT\r", reply, sizeof reply);
     });
-    std::this_thread::sleep_for(std::chrono::milliseconds(300));
-    EXPECT_EQ(result.load(), 99u);  // still waiting for an answer
+    // Still waiting for an answer 300 ms on.
+    EXPECT_FALSE(testing::WaitFor([&] { return result.load() != 99u; },
+                                  std::chrono::milliseconds(300)));
     // Meanwhile a periodic poll gives up rather than queue behind it.
     char reply[256];
     EXPECT_EQ(AtCommandTry(*link, "AT+CSQ\r", reply, sizeof reply), 0u);
@@ -344,21 +346,23 @@ TEST_F(LinkTest, ListenerReportsActiveCallsAndOneEnd) {
         std::lock_guard<std::mutex> lock(m);
         return std::count(posted.begin(), posted.end(), msg);
     };
-    for (int i = 0; i < 400 && count(kMsgCallActive) < 3; ++i)
-        std::this_thread::sleep_for(std::chrono::milliseconds(10));
-    EXPECT_GE(count(kMsgCallActive), 3);  // every pass while the call lasts
+    // Every pass while the call lasts.
+    EXPECT_TRUE(testing::WaitFor([&] { return count(kMsgCallActive) >= 3; }));
     active = false;
-    int polls = callPolls;
-    for (int i = 0; i < 400 && callPolls < polls + 4; ++i)
-        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    const int polls = callPolls;
+    EXPECT_TRUE(testing::WaitFor([&] { return callPolls >= polls + 4; }));
     PortClose(*link);
     EXPECT_EQ(count(kMsgCallListEmpty), 1);
     EXPECT_FALSE(link->listener.joinable());
 }
 
 TEST_F(LinkTest, ListenerRingsForAnIncomingCallWithoutRingText) {
+    std::atomic<int> callPolls{0};
     FakeCard card([&](const std::string& command) {
-        if (command == "AT+CLCC") return Ok("+CLCC: 1,1,4,0,0,\"+441234\",145");
+        if (command == "AT+CLCC") {
+            ++callPolls;
+            return Ok("+CLCC: 1,1,4,0,0,\"+441234\",145");
+        }
         return StandardCard(command);
     });
     auto link = OpenLink(card);
@@ -366,9 +370,10 @@ TEST_F(LinkTest, ListenerRingsForAnIncomingCallWithoutRingText) {
         std::lock_guard<std::recursive_mutex> lock(sink_.mutex);
         return sink_.next;
     };
-    for (int i = 0; i < 400 && handled() < 1; ++i)
-        std::this_thread::sleep_for(std::chrono::milliseconds(10));
-    std::this_thread::sleep_for(std::chrono::milliseconds(100));
+    ASSERT_TRUE(testing::WaitFor([&] { return handled() >= 1; }));
+    // Three more passes of the listener find the same call ringing.
+    const int polls = callPolls;
+    EXPECT_TRUE(testing::WaitFor([&] { return callPolls >= polls + 3; }));
     PortClose(*link);
     EXPECT_EQ(sink_.queued.size(), 1u);  // once, not on every pass
     EXPECT_EQ(sink_.next, 1u);

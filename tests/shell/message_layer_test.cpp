@@ -6,6 +6,8 @@
 #include <atomic>
 #include <thread>
 
+#include "tests/common/wait.h"
+
 namespace vqm {
 namespace {
 
@@ -40,7 +42,9 @@ TEST(MessageLayerTest, AWorkersSendRunsOnTheOwnerThreadAndReturnsTheResult) {
 }
 
 TEST(MessageLayerTest, ClosingReleasesWaitingSendersAndRefusesNewOnes) {
-    MessageLayer layer(nullptr);
+    // A sender wakes the owner once its message is queued: then it is surely waiting.
+    std::atomic<int> queued{0};
+    MessageLayer layer([&] { ++queued; });
     Recorder target;
     std::atomic<int> released{0};
     std::vector<std::thread> workers;
@@ -48,10 +52,11 @@ TEST(MessageLayerTest, ClosingReleasesWaitingSendersAndRefusesNewOnes) {
         workers.emplace_back([&] {
             if (layer.Send(&target, 2127, 0, 0) == 0) ++released;
         });
-    std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    const bool allWaiting = testing::WaitFor([&] { return queued.load() == 4; });
     layer.Close();
     for (std::thread& worker : workers)
         worker.join();
+    ASSERT_TRUE(allWaiting);
     EXPECT_EQ(released.load(), 4);
     EXPECT_TRUE(target.threads.empty());
     std::thread late([&] { EXPECT_EQ(layer.Send(&target, 2127, 0, 0), 0); });
