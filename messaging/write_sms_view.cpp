@@ -93,6 +93,7 @@ WriteSmsView::WriteSmsView(QWidget* parent, ShellContext& context, WriteViewHook
     counter_->setAlignment(Qt::AlignRight | Qt::AlignVCenter);
     status_ = new QLabel(this);
     SetControlId(status_, kWriteStatusId);
+    status_->setTextFormat(Qt::PlainText);  // it names the recipient's number as typed
     QObject::connect(text_, &QPlainTextEdit::textChanged, this, [this] { UpdateCounter(); });
 
     Relayout();

@@ -18,6 +18,7 @@
 #include "calls/dial_pad_view.h"
 #include "contacts/manage_contacts_view.h"
 #include "link/link.h"
+#include "messaging/write_sms_view.h"
 #include "shell/dialogs.h"
 #include "shell/main_window.h"
 #include "shell/ui_log.h"
@@ -104,6 +105,13 @@ TEST_F(HostileTextTest, EveryPlaceShowsOutsideTextAsPlainText) {
              for (int id : {kContactReasonId, kContactOldNameId, kContactOldNumberId})
                  labels.push_back(qobject_cast<QLabel*>(FindControl(&dialog, id)));
              return Of(labels);
+         }},
+        {"write view's sending line",
+         [&] {
+             WriteSmsView write(window_.get(), context_);
+             auto* line = qobject_cast<QLabel*>(FindControl(&write, kWriteStatusId));
+             if (line) line->setText(hostile);  // as "Sending to <number> ..." would be
+             return Of({line});
          }},
         {"message box",
          [&] {
