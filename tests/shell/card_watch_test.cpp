@@ -14,6 +14,7 @@
 #include "support/local_socket.h"
 #include "support/settings_store.h"
 #include "tests/common/temp_folder.h"
+#include "tests/shell/scripted_card_host.h"
 
 namespace vqm {
 namespace {
@@ -48,29 +49,7 @@ class RecordingUi : public ShellUi {
     std::vector<std::string> log;
 };
 
-class ScriptedCard : public CardHost {
-  public:
-    bool CompanionExists() override { return companion; }
-    std::optional<long> SendCompanion(unsigned msg) override {
-        sent.push_back(msg);
-        if (msg != kMsgCardPowerQuery) return 1;
-        if (answers.empty()) return answer;
-        long next = answers.front();
-        answers.pop_front();
-        return next;
-    }
-    int OpenLink() override { return ++opens, openWorks; }
-    void CloseLink() override { ++closes; }
-    int CardPresent() override { return present; }
-    void Sleep(int ms) override { sleeps.push_back(ms); }
-
-    bool companion = true;
-    long answer = 0;
-    std::deque<long> answers;  // taken before answer
-    int openWorks = 1, opens = 0, closes = 0, present = 1;
-    std::vector<unsigned> sent;
-    std::vector<int> sleeps;
-};
+using ScriptedCard = testing::ScriptedCardHost;
 
 class CardWatchTest : public ::testing::Test {
   protected:

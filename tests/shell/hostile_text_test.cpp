@@ -24,7 +24,7 @@
 #include "shell/ui_log.h"
 #include "support/settings_store.h"
 #include "tests/common/temp_folder.h"
-#include "tests/shell/fake_card_host.h"
+#include "tests/shell/scripted_card_host.h"
 
 namespace vqm {
 namespace {
@@ -66,7 +66,7 @@ class HostileTextTest : public ::testing::Test {
     Dialogs dialogs_;
     UiLog uiLog_{temp_ / "ui.log"};
     ShellContext context_{settings_, link_, dialogs_, temp_ / "run", &uiLog_};
-    testing::FakeCardHost card_;
+    testing::ScriptedCardHost card_;
     std::unique_ptr<MainWindow> window_;
 };
 

@@ -21,7 +21,7 @@
 #include "tests/common/sim_card_host.h"
 #include "tests/common/temp_folder.h"
 #include "tests/common/wait.h"
-#include "tests/shell/fake_card_host.h"
+#include "tests/shell/scripted_card_host.h"
 
 namespace vqm {
 namespace {
@@ -41,7 +41,7 @@ class RecordingView : public View {
     std::vector<std::pair<int, unsigned>>& log_;
 };
 
-using FakeCard = testing::FakeCardHost;
+using FakeCard = testing::ScriptedCardHost;
 
 class MainWindowTest : public ::testing::Test {
   protected:
