@@ -16,6 +16,7 @@
 #include "shell/dialogs.h"
 #include "shell/main_window.h"
 #include "shell/messages.h"
+#include "shell/phone_requests.h"
 #include "shell/stall_meter.h"
 #include "shell/ui_log.h"
 #include "shell/view_factories.h"
@@ -125,9 +126,16 @@ int main(int argc, char** argv) {
         window.Command(vqm::kCmdExit);
     });
 
+    // vqm-phone's commands run on the socket's thread, on the dialer's link.
+    vqm::PhoneRequests phone(link, settings, &callLog, &caches,
+                             vqm::WindowSocketPath(runtimeRoot, vqm::kCompanionClass), [&] {
+                                 window.Messages().Post(&window, vqm::kMsgRefreshLists, 0, 0);
+                             });
+
     // The first instance answers later starts, on the window's own thread.
     vqm::LineServer instance;
     if (!instance.Start(instancePath, [&](const std::string& line) {
+            if (vqm::PhoneRequests::IsRequest(line)) return phone.Answer(line);
             return vqm::AnswerWindowMessage(line, [&](unsigned msg, long w, long l) {
                 return window.Messages().Send(&window, msg, w, l);
             });
