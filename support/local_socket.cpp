@@ -205,8 +205,6 @@ void LineServer::Run() {
     Clock::time_point acceptAgainAt{};
     for (;;) {
         auto now = Clock::now();
-        for (size_t i = clients.size(); i-- > 0;)
-            if (now - clients[i].lastHeard >= limits_.idle) drop(i);
         const bool accepting = now >= acceptAgainAt;
         Clock::time_point wakeAt = now + limits_.idle;
         for (const Client& client : clients)
@@ -226,7 +224,11 @@ void LineServer::Run() {
         now = Clock::now();
         for (size_t i = clients.size(); i-- > 0;) {
             const short revents = fds[i + 2].revents;
-            if (!revents) continue;
+            // Silent too long; one that spoke while a slow request held the server is kept.
+            if (!revents) {
+                if (now - clients[i].lastHeard >= limits_.idle) drop(i);
+                continue;
+            }
             Client& client = clients[i];
             bool keep = true;
             if (revents & POLLIN) {
@@ -236,6 +238,7 @@ void LineServer::Run() {
                     client.lastHeard = now;
                     client.pending.append(buffer, static_cast<size_t>(n));
                     Serve(client.pending, client.unsent);
+                    client.lastHeard = Clock::now();  // a slow request is not silence
                     keep = client.pending.size() <= kMaxRequest;
                 } else {
                     keep = n < 0 && (errno == EINTR || errno == EAGAIN);

@@ -224,6 +224,41 @@ TEST_F(LocalSocketTest, AClientThatNeverReadsIsDroppedAndOthersAreServed) {
     EXPECT_EQ(SendLine(path_, "x", 2000), std::string(1000, 'r'));
 }
 
+// A connection that says nothing is let go after the idle time; one that speaks is kept.
+TEST_F(LocalSocketTest, SilentClientsAreDroppedAfterTheIdleTime) {
+    LineServer server;
+    LineServerLimits limits;
+    limits.idle = milliseconds(300);
+    server.SetLimits(limits);
+    ASSERT_TRUE(server.Start(path_, Echo));
+    const int silent = Dial(), talking = Dial();
+    ASSERT_GE(silent, 0);
+    ASSERT_GE(talking, 0);
+    auto closedByServer = [](int fd) {
+        pollfd p{fd, POLLIN, 0};
+        char byte;
+        return poll(&p, 1, 0) == 1 && recv(fd, &byte, 1, MSG_DONTWAIT) == 0;
+    };
+    std::string heard;
+    const bool dropped = testing::WaitFor(
+        [&] {
+            // The talking client says something every pass and reads its echo.
+            if (send(talking, "hi\n", 3, MSG_NOSIGNAL) == 3) {
+                char buffer[64];
+                pollfd p{talking, POLLIN, 0};
+                if (poll(&p, 1, 50) == 1) {
+                    const ssize_t n = recv(talking, buffer, sizeof buffer, MSG_DONTWAIT);
+                    if (n > 0) heard.assign(buffer, static_cast<size_t>(n));
+                }
+            }
+            return closedByServer(silent);
+        },
+        milliseconds(5000));
+    EXPECT_TRUE(dropped);
+    EXPECT_FALSE(closedByServer(talking));
+    EXPECT_EQ(heard.substr(0, 3), "hi\n");
+}
+
 // A crowd of idle connections (more than the server takes) costs neither descriptors nor
 // processor time, and a caller that says something is still answered.
 TEST_F(LocalSocketTest, AnIdleCrowdTakesNeitherDescriptorsNorTheProcessor) {
