@@ -7,6 +7,7 @@
 #include <QLabel>
 #include <QMessageBox>
 #include <QTimer>
+#include <filesystem>
 #include <fstream>
 #include <functional>
 #include <sstream>
@@ -143,6 +144,11 @@ TEST_F(HostileTextTest, EveryPlaceShowsOutsideTextAsPlainText) {
             EXPECT_EQ(text, hostile);
         }
     }
+    // As a person sees it: the DialPad with the text on every line, kept next to the test.
+    window_->ShowStatus(kHostile, kHostile);
+    const std::string folder = VQM_SCREENSHOT_DIR;
+    std::filesystem::create_directories(folder);
+    EXPECT_TRUE(window_->grab().save(QString::fromStdString(folder + "/hostile-text.png")));
 }
 
 // The ui log is read in a terminal and by scripts: one event stays one line, and control
