@@ -9,6 +9,7 @@
 
 #include "settings/barring_at.h"
 #include "shell/dialogs.h"
+#include "shell/messages.h"
 
 namespace vqm {
 
@@ -128,6 +129,11 @@ BarringPage::BarringPage(QWidget* parent, ShellContext& context)
 
 BarringPage::~BarringPage() = default;
 
+long BarringPage::OnMessage(unsigned msg, long wParam, long) {
+    if (msg != kWmCommand) return 0;
+    return TapControl(SubPage(pages_.current), this, static_cast<int>(wParam & 0xFFFF));
+}
+
 void BarringPage::BuildSubPage(View* page, int index) {
     // Built before the tab strip places the sub-page, which then spans the page.
     const int width = this->width();
@@ -243,6 +249,12 @@ void BarringPage::Request(int index) {
                       Mark(index, id)->setText(result == 1   ? QString::fromUtf8("\u2713")
                                                : result == 0 ? QString()
                                                              : QString("?"));
+                      LogShown(context_, "settings-barring",
+                               QString("%1 %2 %3")
+                                   .arg(kClassTitles[index], ButtonOf(id)->caption,
+                                        result == 1   ? "barred"
+                                        : result == 0 ? "not-barred"
+                                                      : "unknown"));
                   });
     }
 }

@@ -52,6 +52,7 @@ class BarringPage : public View {
 
     BarringPage(QWidget* parent, ShellContext& context);
     ~BarringPage() override;
+    long OnMessage(unsigned msg, long wParam, long lParam) override;
 
     View* SubPage(int index) const { return pages_.records[index].window; }
     static int ClassOf(int index) { return 1 << index; }

@@ -1,5 +1,6 @@
 #include "settings/forward_page.h"
 
+#include <QAbstractButton>
 #include <QApplication>
 #include <QComboBox>
 #include <QDialogButtonBox>
@@ -15,6 +16,8 @@
 #include "settings/forwarding_at.h"
 #include "shell/card_watch.h"
 #include "shell/dialogs.h"
+#include "shell/messages.h"
+#include "shell/ui_log.h"
 #include "support/settings_store.h"
 
 namespace vqm {
@@ -42,6 +45,19 @@ std::u16string StoredNumberName(int serviceClass, int reason) {
 }
 
 }  // namespace
+
+long TapControl(QWidget* subPage, QWidget* page, int id) {
+    QWidget* control = subPage ? FindControl(subPage, id) : nullptr;
+    if (!control) control = FindControl(page, id);
+    auto* button = qobject_cast<QAbstractButton*>(control);
+    if (!button || !button->isEnabled()) return 0;
+    button->click();
+    return 1;
+}
+
+void LogShown(ShellContext& context, const char* kind, const QString& text) {
+    if (context.uiLog) context.uiLog->Line(kind, text.toStdU16String());
+}
 
 // CardJobs
 
@@ -176,6 +192,11 @@ ForwardPage::ForwardPage(QWidget* parent, ShellContext& context)
 
 ForwardPage::~ForwardPage() = default;
 
+long ForwardPage::OnMessage(unsigned msg, long wParam, long) {
+    if (msg != kWmCommand) return 0;
+    return TapControl(SubPage(pages_.current), this, static_cast<int>(wParam & 0xFFFF));
+}
+
 void ForwardPage::BuildSubPage(View* page, int index) {
     // Built before the tab strip places the sub-page, which then spans the page.
     const int width = this->width();
@@ -237,6 +258,10 @@ void ForwardPage::Request(int index) {
             [this, index, reason, number](int result) {
                 State(index, reason)
                     ->setText(result == 1 ? Q(*number) : Q(result == 0 ? kNotActive : kUnknown));
+                LogShown(context_, "settings-forward",
+                         QString("%1 %2 %3")
+                             .arg(kClassNames[index], kRowLabels[reason],
+                                  State(index, reason)->text()));
                 // Unconditional forwarding takes every call, so the conditional ones do not
                 // apply while it is on.
                 if (reason == kForwardUnconditional && (result == 0 || result == 1))

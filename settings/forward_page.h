@@ -49,6 +49,12 @@ inline bool CardFailed(int result) {
     return result == -1 || result == 4;
 }
 
+// A WM_COMMAND to a settings page (over the dialer's socket, or a menu): the control with
+// that id is tapped, looked for in the sub-page shown first, then in the page. 1 when found.
+long TapControl(QWidget* subPage, QWidget* page, int id);
+// One line of what a page shows, for the dialer's --ui-log record: "<kind> <text>".
+void LogShown(ShellContext& context, const char* kind, const QString& text);
+
 inline constexpr int kForwardTabId = 1067;
 inline constexpr int kForwardStateFirstId = 1068;   // + reason: the row's state
 inline constexpr int kForwardButtonFirstId = 1072;  // + reason: the row's button
@@ -88,6 +94,7 @@ class ForwardPage : public View {
 
     ForwardPage(QWidget* parent, ShellContext& context);
     ~ForwardPage() override;
+    long OnMessage(unsigned msg, long wParam, long lParam) override;
 
     // The sub-page of class index 0 voice, 1 data, 2 fax, and its class value (1, 2, 4).
     View* SubPage(int index) const { return pages_.records[index].window; }

@@ -11,6 +11,7 @@
 
 #include "settings/security_at.h"
 #include "shell/dialogs.h"
+#include "shell/messages.h"
 
 namespace vqm {
 
@@ -133,6 +134,11 @@ SecurityPage::SecurityPage(QWidget* parent, ShellContext& context)
 
 SecurityPage::~SecurityPage() = default;
 
+long SecurityPage::OnMessage(unsigned msg, long wParam, long) {
+    if (msg != kWmCommand) return 0;
+    return TapControl(nullptr, this, static_cast<int>(wParam & 0xFFFF));
+}
+
 QPushButton* SecurityPage::Button(int id) const {
     return qobject_cast<QPushButton*>(FindControl(const_cast<SecurityPage*>(this), id));
 }
@@ -144,6 +150,10 @@ void SecurityPage::Box(const std::u16string& text) {
 void SecurityPage::Mark(int onId, int offId, int state) {
     Button(onId)->setChecked(state == 1);
     Button(offId)->setChecked(state == 0);
+    LogShown(context_, "settings-security",
+             QString("%1 %2")
+                 .arg(onId == kPinRequestOnId ? "pin-request" : "phone-lock",
+                      state == 1 ? "on" : state == 0 ? "off" : "unknown"));
 }
 
 void SecurityPage::PinRequest(int mode) {

@@ -51,6 +51,7 @@ class SecurityPage : public View {
   public:
     SecurityPage(QWidget* parent, ShellContext& context);
     ~SecurityPage() override;
+    long OnMessage(unsigned msg, long wParam, long lParam) override;
 
     QPushButton* Button(int id) const;
     const CardJobs& Jobs() const { return jobs_; }

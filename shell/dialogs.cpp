@@ -1,10 +1,18 @@
 #include "shell/dialogs.h"
 
+#include <QAbstractButton>
+#include <QComboBox>
 #include <QDialog>
 #include <QLabel>
+#include <QLineEdit>
 #include <QMessageBox>
+#include <cstdio>
+#include <fstream>
 #include <optional>
+#include <sstream>
 #include <vector>
+
+#include "shell/views.h"
 
 #include "shell/ui_log.h"
 
@@ -113,7 +121,31 @@ int Dialogs::MessageBox(QWidget* parent, const std::u16string& text, const std::
     return answer;
 }
 
+void Dialogs::FillFromFile(QDialog* dialog) {
+    std::ifstream file(fieldsFile_);
+    std::string line;
+    if (!file || !std::getline(file, line)) return;
+    std::istringstream words(line);
+    std::string name, item;
+    if (!(words >> name) || name != dialog->objectName().toStdString()) return;
+    file.close();
+    std::remove(fieldsFile_.c_str());  // one dialog's worth
+    while (words >> item) {
+        const size_t equals = item.find('=');
+        QWidget* control = FindControl(dialog, std::atoi(item.substr(0, equals).c_str()));
+        const QString text = QString::fromStdString(
+            equals == std::string::npos ? std::string() : item.substr(equals + 1));
+        if (auto* edit = qobject_cast<QLineEdit*>(control))
+            edit->setText(text);
+        else if (auto* list = qobject_cast<QComboBox*>(control))
+            list->setCurrentIndex(list->findText(text));
+        else if (auto* button = qobject_cast<QAbstractButton*>(control))
+            button->click();
+    }
+}
+
 int Dialogs::Run(QDialog* dialog) {
+    if (autoAnswer_ && !responder_ && !fieldsFile_.empty()) FillFromFile(dialog);
     const DialogRequest request{dialog->objectName().toStdU16String(),
                                 dialog->windowTitle().toStdU16String(), 0, true, dialog};
     if (const auto answer = Answer(request)) return *answer;

@@ -35,6 +35,10 @@ class Dialogs {
     // Scripted runs: every box and dialog is answered at once with this id (1 OK, 2 Cancel)
     // instead of waiting for a person; 0 asks the person.
     void SetAutoAnswer(int id) { autoAnswer_ = id; }
+    // Scripted runs: before a dialog is answered, the file at path (when there) fills it in and
+    // is removed. One line: the dialog's object name, then "ID=text" (an edit's text or a list's
+    // entry) and "ID" (a button clicked), e.g. "ENTER_ACCESS_CODE_DIALOG 1171=0000".
+    void SetFieldsFile(std::string path) { fieldsFile_ = std::move(path); }
     // Each box and dialog, with its texts and the answer, goes to the log as well.
     void SetLog(UiLog* log) { log_ = log; }
 
@@ -43,7 +47,10 @@ class Dialogs {
     void Record(const DialogRequest& request, int answer);
 
     Responder responder_;
+    void FillFromFile(QDialog* dialog);
+
     int autoAnswer_ = 0;
+    std::string fieldsFile_;
     UiLog* log_ = nullptr;
 };
 

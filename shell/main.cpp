@@ -26,7 +26,8 @@
 namespace {
 
 constexpr char kUsage[] =
-    "Usage: vqm-dialer [--ui-log FILE] [--answer-boxes ok|cancel] [--stall-log FILE]\n"
+    "Usage: vqm-dialer [--ui-log FILE] [--answer-boxes ok|cancel] [--dialog-fields FILE]\n"
+    "                  [--stall-log FILE]\n"
     "       vqm-dialer --help | --version | --list-ports\n"
     "The VQM Dialer: a phone on a GSM card modem.\n"
     "\n"
@@ -37,6 +38,9 @@ constexpr char kUsage[] =
     "                 box and dialog the dialer shows\n"
     "  --answer-boxes ok|cancel\n"
     "                 for scripted runs: answer every message box and dialog at once\n"
+    "  --dialog-fields FILE\n"
+    "                 with --answer-boxes: fill the next dialog from FILE first (one line: its\n"
+    "                 name, then ID=text and ID to click; the file is removed once used)\n"
     "  --stall-log FILE\n"
     "                 for the figures: append a line to FILE each time the window's thread\n"
     "                 is kept from its events for 2 ms or more (a 5 ms timer comes late)\n"
@@ -60,7 +64,7 @@ int ListPorts() {
 }  // namespace
 
 int main(int argc, char** argv) {
-    std::string uiLogPath, stallLogPath;
+    std::string uiLogPath, stallLogPath, dialogFieldsPath;
     int autoAnswer = 0;
     for (int i = 1; i < argc; ++i) {
         const bool hasValue = i + 1 < argc;
@@ -76,6 +80,8 @@ int main(int argc, char** argv) {
             uiLogPath = argv[++i];
         } else if (!std::strcmp(argv[i], "--stall-log") && hasValue) {
             stallLogPath = argv[++i];
+        } else if (!std::strcmp(argv[i], "--dialog-fields") && hasValue) {
+            dialogFieldsPath = argv[++i];
         } else if (!std::strcmp(argv[i], "--answer-boxes") && hasValue &&
                    (autoAnswer = ParseAnswer(argv[i + 1]))) {
             ++i;
@@ -107,6 +113,7 @@ int main(int argc, char** argv) {
     vqm::Dialogs dialogs;
     dialogs.SetLog(&uiLog);
     dialogs.SetAutoAnswer(autoAnswer);
+    dialogs.SetFieldsFile(dialogFieldsPath);
     vqm::CallLog callLog(settings);
     vqm::PhonebookCaches caches(settings);
     vqm::ShellContext context{settings, link, dialogs, runtimeRoot};
