@@ -469,7 +469,8 @@ long SmsFolderView::OnMessage(unsigned msg, long wParam, long) {
                 StartRefresh();
             } else if (refreshState_ == kFolderRefreshed &&
                        IndexListCount(context_.settings, kNewIdx) > 0) {
-                OnCard([this] { return SmsIntakeNew(store_, context_.link); });
+                // On the window's thread: the intake files into the pages as it goes.
+                SmsIntakeNew(store_, context_.link);
             }
             break;
         case kMsgSimRefreshDone:
