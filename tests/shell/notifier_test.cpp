@@ -17,7 +17,7 @@
 #include <vector>
 
 #include "shell/notifier.h"
-#include "tests/common/process.h"
+#include "tests/common/wait.h"
 
 namespace vqm {
 namespace {
@@ -86,12 +86,7 @@ class NotifierTest : public ::testing::Test {
     // Lets the dialer's side take in what the service sent.
     template <typename Condition>
     bool Pump(Condition condition, std::chrono::milliseconds limit = std::chrono::seconds(5)) {
-        return testing::WaitFor(
-            [&] {
-                QCoreApplication::processEvents();
-                return condition();
-            },
-            limit);
+        return testing::WaitPumping(condition, limit);
     }
     std::vector<FakeNotificationService::Posted> Posted() {
         std::lock_guard<std::mutex> lock(service_.mutex);
