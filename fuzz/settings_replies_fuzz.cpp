@@ -2,6 +2,7 @@
 // scan (and, for barring, the asked class); the rest is the reply, copied into a buffer of exactly
 // its size so that any read past it is caught by the address sanitizer.
 #include <cstdint>
+#include <cstring>
 #include <vector>
 
 #include "settings/barring_at.h"
@@ -36,11 +37,16 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
             break;
         }
         case 3:
-            vqm::ParseBarringReply(text, length, 1 << (selector / 6 % 3));
+        case 4: {
+            // Without the tag the card's own error report is read, worded from the reply.
+            vqm::CardError error;
+            if (selector % 6 == 3)
+                vqm::ParseBarringReply(text, length, 1 << (selector / 6 % 3), &error);
+            else
+                vqm::ParseLockReply(text, length, &error);
+            if (std::strlen(vqm::CardErrorReason(error)) >= sizeof error.text) __builtin_trap();
             break;
-        case 4:
-            vqm::ParseLockReply(text, length);
-            break;
+        }
         default: {
             const int waiting = vqm::ParseCallWaitingReply(text, length);
             if (waiting < -1 || waiting > 1) __builtin_trap();

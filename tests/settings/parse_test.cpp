@@ -224,8 +224,8 @@ TEST(BarringScan, ReportedClassesAgainstTheAskedOne) {
 
     // Without the tag the final result stands in for the state: ERROR is not "not barred".
     EXPECT_EQ(Barring("\r\nERROR\r\n", 1), 4);
-    // "+CME ERROR: n" is no final result the link knows: -1, a failure like ERROR.
-    EXPECT_EQ(Barring("\r\n+CME ERROR: 16\r\n", 1), -1);
+    // The card's own refusal is a failure like ERROR, not a state.
+    EXPECT_EQ(Barring("\r\n+CME ERROR: 16\r\n", 1), 4);
     EXPECT_EQ(Barring("\r\nOK\r\n", 1), 0);
     EXPECT_EQ(Barring("\r\ngarbage", 1), -1);
     EXPECT_EQ(Barring("\r\n+CLCK: ?\r\nOK\r\n", 1), -1);
@@ -239,7 +239,7 @@ TEST(LockScan, StatusOrFinalResult) {
     EXPECT_EQ(lock("\r\n+CLCK: 0\r\n\r\nOK\r\n"), 0);
     EXPECT_EQ(lock("\r\n+CLCK: 1,7\r\n\r\nOK\r\n"), 1);
     EXPECT_EQ(lock("\r\nERROR\r\n"), 4);
-    EXPECT_EQ(lock("\r\n+CME ERROR: 10\r\n"), -1);
+    EXPECT_EQ(lock("\r\n+CME ERROR: 10\r\n"), 4);
     EXPECT_EQ(lock("\r\n+CLCK:"), -1);
     EXPECT_EQ(lock(""), -1);
 }
