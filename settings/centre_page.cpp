@@ -15,6 +15,7 @@
 
 #include "shell/dialogs.h"
 #include "shell/messages.h"
+#include "shell/ui_log.h"
 #include "support/settings_store.h"
 
 namespace vqm {
@@ -60,7 +61,8 @@ CentreDialog::CentreDialog(QWidget* parent, const CentreEntry& entry) : QDialog(
         sendAs->addItem(QString::fromStdU16String(text));
     // A stored text that is not one of the choices shows the default.
     const int v = validity->findText(QString::fromStdU16String(entry.validity));
-    validity->setCurrentIndex(v >= 0 ? v : validity->findText(QString::fromStdU16String(kDefaultValidity)));
+    validity->setCurrentIndex(
+        v >= 0 ? v : validity->findText(QString::fromStdU16String(kDefaultValidity)));
     const int s = sendAs->findText(QString::fromStdU16String(entry.sendAs));
     sendAs->setCurrentIndex(s >= 0 ? s : 0);
     form->addRow("Name:", name);
@@ -115,6 +117,14 @@ CentrePage::CentrePage(QWidget* parent, ShellContext& context) : View(parent), c
 long CentrePage::OnMessage(unsigned msg, long wParam, long) {
     // The card has just connected: it learns the chosen centre again.
     if (msg == kMsgCardStateChanged && wParam == 2) Load(true);
+    if (msg != kWmCommand) return 0;
+    const int id = static_cast<int>(wParam & 0xFFFF);
+    if (auto* button = qobject_cast<QAbstractButton*>(FindControl(this, id))) {
+        if (button->isEnabled()) button->click();
+    } else if (id >= kSettingsRowCommandFirst &&
+               id < kSettingsRowCommandFirst + list_->topLevelItemCount()) {
+        list_->setCurrentItem(list_->topLevelItem(id - kSettingsRowCommandFirst));
+    }
     return 0;
 }
 
@@ -128,7 +138,9 @@ void CentrePage::Load(bool pushToCard) {
         UseSimDefault(true);
     } else if (!centres_.useSimDefault && centres_.chosen >= 0) {
         const CentreEntry entry = centres_.entries[centres_.chosen];
-        exchange_.Run([this, entry] { return PushCentre(context_.link, entry); }, [](int) {});
+        exchange_.Run(
+            [this, entry] { return PushCentre(context_.link, entry); },
+            [this, entry](int ok) { Log((ok ? u"chosen " : u"refused ") + entry.number); });
     }
 }
 
@@ -204,16 +216,24 @@ void CentrePage::Select(int row) {
     if (exchange_.Busy() || row < 0 || row >= static_cast<int>(centres_.entries.size())) return;
     const CentreEntry entry = centres_.entries[row];
     exchange_.Run([this, entry] { return PushCentre(context_.link, entry); },
-             [this, row](int ok) {
-                 // A card that refused keeps the marks and the choice as they were.
-                 if (!ok || row >= static_cast<int>(centres_.entries.size())) return;
-                 centres_.chosen = row;
-                 centres_.useSimDefault = false;
-                 SaveChosenCentre(context_.settings, row);
-                 SaveUseSimDefault(context_.settings, false);
-                 useSim_->setChecked(false);
-                 MarkChosen(row);
-             });
+                  [this, row, entry](int ok) {
+                      // A card that refused keeps the marks and the choice as they were.
+                      if (!ok || row >= static_cast<int>(centres_.entries.size())) {
+                          Log(u"refused " + entry.number);
+                          return;
+                      }
+                      Log(u"chosen " + entry.number);
+                      centres_.chosen = row;
+                      centres_.useSimDefault = false;
+                      SaveChosenCentre(context_.settings, row);
+                      SaveUseSimDefault(context_.settings, false);
+                      useSim_->setChecked(false);
+                      MarkChosen(row);
+                  });
+}
+
+void CentrePage::Log(const std::u16string& text) {
+    if (context_.uiLog) context_.uiLog->Line("settings-centre", text);
 }
 
 void CentrePage::UseSimDefault(bool use) {
@@ -229,17 +249,17 @@ void CentrePage::UseSimDefault(bool use) {
         return;
     }
     exchange_.Run([this] { return PushSimDefault(context_.link); },
-             [this](int ok) {
-                 if (!ok) {
-                     useSim_->setChecked(centres_.useSimDefault);
-                     return;
-                 }
-                 centres_.useSimDefault = true;
-                 centres_.simDefaultAbsent = false;
-                 SaveUseSimDefault(context_.settings, true);
-                 useSim_->setChecked(true);
-                 MarkChosen(-1);
-             });
+                  [this](int ok) {
+                      if (!ok) {
+                          useSim_->setChecked(centres_.useSimDefault);
+                          return;
+                      }
+                      centres_.useSimDefault = true;
+                      centres_.simDefaultAbsent = false;
+                      SaveUseSimDefault(context_.settings, true);
+                      useSim_->setChecked(true);
+                      MarkChosen(-1);
+                  });
 }
 
 void CentrePage::resizeEvent(QResizeEvent*) {

@@ -70,6 +70,8 @@ class CentrePage : public View {
     // The dialog until it is cancelled or gives a number; false when cancelled.
     bool AskEntry(CentreEntry* entry);
     void MarkChosen(int chosen);
+    // What the page did, for the program's record of its window (--ui-log).
+    void Log(const std::u16string& text);
 
     ShellContext& context_;
     CentreList centres_;

@@ -10,8 +10,7 @@ namespace vqm {
 const char16_t* const kValidityChoices[kValidityChoiceCount] = {
     u"1 hour", u"6 hours", u"24 hours", u"72 hours", u"1 week", u"Maximum time"};
 // The kinds of message a centre can convert a text into, as networks offer them.
-const char16_t* const kSendAsChoices[kSendAsChoiceCount] = {u"Text", u"Fax", u"Paging",
-                                                            u"E-mail"};
+const char16_t* const kSendAsChoices[kSendAsChoiceCount] = {u"Text", u"Fax", u"Paging", u"E-mail"};
 
 namespace {
 

@@ -3,6 +3,7 @@
 #include <QCheckBox>
 #include <QLabel>
 
+#include "shell/messages.h"
 #include "support/settings_store.h"
 
 namespace vqm {
@@ -24,8 +25,7 @@ bool ReadFlag(SettingsStore& store, const char16_t* name) {
 
 }  // namespace
 
-GeneralPage::GeneralPage(QWidget* parent, ShellContext& context)
-    : View(parent), context_(context) {
+GeneralPage::GeneralPage(QWidget* parent, ShellContext& context) : View(parent), context_(context) {
     title_ = new QLabel("Phonebook Settings:", this);
     refreshSim_ = new QCheckBox(this);
     refreshOutlook_ = new QCheckBox(this);
@@ -38,7 +38,8 @@ GeneralPage::GeneralPage(QWidget* parent, ShellContext& context)
         QCheckBox* box;
         const char16_t* name;
     };
-    for (const Pair& pair : {Pair{refreshSim_, kRefreshSim}, Pair{refreshOutlook_, kRefreshOutlook}}) {
+    for (const Pair& pair :
+         {Pair{refreshSim_, kRefreshSim}, Pair{refreshOutlook_, kRefreshOutlook}}) {
         pair.box->setChecked(ReadFlag(context_.settings, pair.name));
         // clicked, not toggled: reading the settings above must not write them back.
         QObject::connect(pair.box, &QCheckBox::clicked, this, [this, pair] {
@@ -47,6 +48,12 @@ GeneralPage::GeneralPage(QWidget* parent, ShellContext& context)
         });
     }
     Relayout();
+}
+
+long GeneralPage::OnMessage(unsigned msg, long wParam, long) {
+    if (msg == kWmCommand)
+        if (QCheckBox* box = Box(static_cast<int>(wParam & 0xFFFF))) box->click();
+    return 0;
 }
 
 QCheckBox* GeneralPage::Box(int id) const {

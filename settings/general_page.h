@@ -18,6 +18,7 @@ class GeneralPage : public View {
   public:
     GeneralPage(QWidget* parent, ShellContext& context);
 
+    long OnMessage(unsigned msg, long wParam, long lParam) override;
     QCheckBox* Box(int id) const;
 
   protected:

@@ -4,6 +4,8 @@
 #include <QListWidget>
 #include <QRadioButton>
 
+#include "settings/settings_view.h"
+#include "shell/messages.h"
 #include "support/settings_store.h"
 
 namespace vqm {
@@ -13,7 +15,7 @@ namespace {
 constexpr char16_t kMethodSetting[] = u"SettingsModemMethod";
 constexpr char16_t kSpeedSetting[] = u"SettingsModemSpeed";
 constexpr int kMargin = 10;
-constexpr int kRightColumn = 100;  // the speed list stands this far from the right edge
+constexpr int kRightColumn = 100;       // the speed list stands this far from the right edge
 constexpr int kSpeedFastestUpload = 1;  // 43.2 downloads, but uploads at 14.4
 const char* const kMethodNames[kModemMethodCount] = {"Modem", "ISDN v.110", "ISDN v.120"};
 const char* const kSpeedItems[kModemSpeedCount] = {"9.6 kbits/s", "14.4 kbits/s", "19.2 kbits/s",
@@ -48,6 +50,17 @@ ModemPage::ModemPage(QWidget* parent, ShellContext& context, ModemDriverFiles fi
             int method = 0, speed = 0;
             Store(&method, &speed);
         });
+}
+
+long ModemPage::OnMessage(unsigned msg, long wParam, long) {
+    if (msg != kWmCommand) return 0;
+    const int id = static_cast<int>(wParam & 0xFFFF);
+    if (auto* button = qobject_cast<QAbstractButton*>(FindControl(this, id))) {
+        button->click();
+    } else if (id >= kSettingsRowCommandFirst && id < kSettingsRowCommandFirst + kModemSpeedCount) {
+        speeds_->setCurrentRow(id - kSettingsRowCommandFirst);
+    }
+    return 0;
 }
 
 ModemPage::~ModemPage() {

@@ -26,6 +26,8 @@ class ModemPage : public View {
     // Leaving writes the command of what the page shows, as every click does.
     ~ModemPage() override;
 
+    long OnMessage(unsigned msg, long wParam, long lParam) override;
+
     // The list's selection changed: labels follow the speed, and the command is written.
     void UpdateModemPage();
 

@@ -130,8 +130,8 @@ int ParseOperatorSearch(const char* reply, int length, OperatorName* names, int 
     bracketed.SkipBlanks();
     if (bracketed.Literal("(")) {
         int found = 0;
-        ParseBracketedSearch(FieldCursor(reply + at + kCopsTagLength, end), names, codes,
-                             maxNames, &found);
+        ParseBracketedSearch(FieldCursor(reply + at + kCopsTagLength, end), names, codes, maxNames,
+                             &found);
         if (count) *count = found;
         return 1;
     }
@@ -156,8 +156,7 @@ int ParseOperatorSearch(const char* reply, int length, OperatorName* names, int 
     return 1;
 }
 
-int NetworkSearchCodes(Link& link, OperatorName* names, int32_t* codes, int maxNames,
-                       int* count) {
+int NetworkSearchCodes(Link& link, OperatorName* names, int32_t* codes, int maxNames, int* count) {
     static_assert(kSearchReplySize >= 256);
     char reply[kSearchReplySize];
     const int length = static_cast<int>(AtCommand(link, "AT+COPS=?\r", reply, sizeof reply));

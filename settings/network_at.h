@@ -48,8 +48,7 @@ int ParseOperatorSearch(const char* reply, int length, OperatorName* names, int 
                         int* count, int32_t* codes = nullptr);
 
 // As NetworkSearch, with each entry's code as ParseOperatorSearch gives it.
-int NetworkSearchCodes(Link& link, OperatorName* names, int32_t* codes, int maxNames,
-                       int* count);
+int NetworkSearchCodes(Link& link, OperatorName* names, int32_t* codes, int maxNames, int* count);
 
 // As NetworkRegister; a name the table does not hold registers fallbackCode instead when it is
 // a code (a network named by the modem itself). -1 when neither gives a code.

@@ -8,6 +8,7 @@
 
 #include "shell/dialogs.h"
 #include "shell/messages.h"
+#include "shell/ui_log.h"
 
 namespace vqm {
 
@@ -19,8 +20,7 @@ constexpr int kResultError = 4;
 
 }  // namespace
 
-NetworkPage::NetworkPage(QWidget* parent, ShellContext& context)
-    : View(parent), context_(context) {
+NetworkPage::NetworkPage(QWidget* parent, ShellContext& context) : View(parent), context_(context) {
     label_ = new QLabel("Current Operator:", this);
     operator_ = new QLineEdit(this);
     operator_->setReadOnly(true);
@@ -52,7 +52,20 @@ NetworkPage::NetworkPage(QWidget* parent, ShellContext& context)
 
 long NetworkPage::OnMessage(unsigned msg, long wParam, long) {
     if (msg == kMsgCardStateChanged && wParam == 2) Refresh();
+    if (msg != kWmCommand) return 0;
+    const int id = static_cast<int>(wParam & 0xFFFF);
+    QWidget* control = FindControl(this, id);
+    if (auto* button = qobject_cast<QAbstractButton*>(control)) {
+        if (button->isEnabled()) button->click();
+    } else if (id >= kSettingsRowCommandFirst &&
+               id < kSettingsRowCommandFirst + networks_->count()) {
+        networks_->setCurrentRow(id - kSettingsRowCommandFirst);
+    }
     return 0;
+}
+
+void NetworkPage::Log(const std::u16string& text) {
+    if (context_.uiLog) context_.uiLog->Line("settings-network", text);
 }
 
 int NetworkPage::Box(const char16_t* text, unsigned icon) {
@@ -73,6 +86,8 @@ void NetworkPage::Refresh() {
             // field as it was.
             if (known) operator_->setText(QString::fromStdU16String(foundOperator_));
             ShowMode(foundMode_);
+            Log(u"operator " + operator_->text().toStdU16String() +
+                (foundMode_ == 0 ? u" automatic" : u" manual"));
         });
 }
 
@@ -155,6 +170,10 @@ void NetworkPage::Search() {
                 networks_->addItem(QString::fromStdU16String(name));
             listedCodes_ = foundCodes_;
             register_->setEnabled(true);
+            std::u16string listed = u"found";
+            for (const std::u16string& name : foundNames_)
+                listed += u" " + name + u";";
+            Log(listed);
         });
 }
 
@@ -166,15 +185,16 @@ void NetworkPage::Register() {
     }
     const std::u16string name = networks_->item(row)->text().toStdU16String();
     const int32_t code = row < static_cast<int>(listedCodes_.size()) ? listedCodes_[row] : -1;
-    exchange_.Run([this, name, code] { return NetworkRegisterListed(context_.link, name.c_str(), code); },
-                  [this, name](int result) {
-                      if (result == -1 || result == kResultError) {
-                          Box(u"Network Registration Failure.", kMbIconError);
-                      } else if (result == 0) {
-                          Box(u"Network Registration Success.", kMbIconInformation);
-                          operator_->setText(QString::fromStdU16String(name));
-                      }
-                  });
+    exchange_.Run(
+        [this, name, code] { return NetworkRegisterListed(context_.link, name.c_str(), code); },
+        [this, name](int result) {
+            if (result == -1 || result == kResultError) {
+                Box(u"Network Registration Failure.", kMbIconError);
+            } else if (result == 0) {
+                Box(u"Network Registration Success.", kMbIconInformation);
+                operator_->setText(QString::fromStdU16String(name));
+            }
+        });
 }
 
 void NetworkPage::resizeEvent(QResizeEvent*) {

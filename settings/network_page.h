@@ -20,9 +20,8 @@ class QRadioButton;
 
 namespace vqm {
 
-inline constexpr int kNetworkOperatorId = 1060, kNetworkAutomaticId = 1061,
-                     kNetworkManualId = 1062, kNetworkListId = 1063, kNetworkSearchId = 1064,
-                     kNetworkRegisterId = 1065;
+inline constexpr int kNetworkOperatorId = 1060, kNetworkAutomaticId = 1061, kNetworkManualId = 1062,
+                     kNetworkListId = 1063, kNetworkSearchId = 1064, kNetworkRegisterId = 1065;
 // More networks than any search hears; the rest of a longer reply is left out.
 inline constexpr int kMaxNetworks = 128;
 
@@ -55,6 +54,8 @@ class NetworkPage : public View {
     void Relayout();
     void ShowMode(int mode);
     int Box(const char16_t* text, unsigned icon);
+    // What the page shows, for the program's record of its window (--ui-log).
+    void Log(const std::u16string& text);
 
     ShellContext& context_;
     // Set by the first search that worked and never cleared: Manual offers Register after it.

@@ -126,6 +126,16 @@ void SettingsView::FollowCardState() {
 // Pages hear of the card state with the state itself in wParam.
 long SettingsView::OnMessage(unsigned msg, long wParam, long lParam) {
     if (msg == kMsgCardStateChanged) FollowCardState();
+    if (msg == kWmCommand) {
+        const int id = static_cast<int>(wParam & 0xFFFF);
+        if (id >= kSettingsPageCommandFirst && id < kSettingsPageCommandFirst + pages_.Count()) {
+            if (auto* tabs = qobject_cast<QTabBar*>(FindControl(this, kSettingsTabId)))
+                tabs->setCurrentIndex(id - kSettingsPageCommandFirst);
+            return 0;
+        }
+        View* page = Page(pages_.current);
+        return page ? page->OnMessage(msg, wParam, lParam) : 0;
+    }
     // The view coming forward shows its current page again; the card's news is for every page.
     if (msg == kMsgViewShown) {
         View* page = Page(pages_.current);

@@ -17,6 +17,11 @@ inline constexpr int kSettingsPageCount = 9;
 inline constexpr int kSettingsGeneral = 0, kSettingsMessages = 1, kSettingsNetwork = 2,
                      kSettingsCallForward = 3, kSettingsCallBarring = 4, kSettingsSecurity = 5,
                      kSettingsModem = 6, kSettingsCallWaiting = 7, kSettingsTones = 8;
+// Commands from outside (a script driving the dialer through its socket, as a tap would):
+// 1110 + n brings page n forward; 1300 + n picks row n of the list on the page in front. Every
+// other command goes to the page in front as its control's click.
+inline constexpr int kSettingsPageCommandFirst = 1110;
+inline constexpr int kSettingsRowCommandFirst = 1300, kSettingsRowCommandCount = 200;
 
 // A page's exchanges with the card: each runs on the page's own worker with the wait cursor
 // shown, and its result comes back to done on the window's thread, so the window keeps

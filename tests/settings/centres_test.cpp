@@ -18,9 +18,15 @@ TEST(CentreValidity, FirstContainedTextGivesTheValue) {
         const char16_t* text;
         int value;
     } cases[] = {
-        {u"1 hour", 0},         {u"6 hours", 5},      {u"24 hours", 23},
-        {u"72 hours", 71},      {u"1 week", 167},     {u"Maximum time", 255},
-        {u"about 24 hours", 23}, {u"", 0},            {u"2 weeks", 0},
+        {u"1 hour", 0},
+        {u"6 hours", 5},
+        {u"24 hours", 23},
+        {u"72 hours", 71},
+        {u"1 week", 167},
+        {u"Maximum time", 255},
+        {u"about 24 hours", 23},
+        {u"", 0},
+        {u"2 weeks", 0},
         {u"maximum time", 0},  // containment is exact, case included
         // "6 hours" is looked for before "72 hours": the first hit in table order wins.
         {u"6 hours or 72 hours", 5},

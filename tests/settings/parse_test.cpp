@@ -132,8 +132,8 @@ TEST(OperatorSearchScan, ReadsTheStandardBracketedLayout) {
         const std::string reply = c.reply;
         // The reply in a buffer of its exact size, so a read past it is a read past the heap.
         std::vector<char> exact(reply.begin(), reply.end());
-        EXPECT_EQ(ParseOperatorSearch(exact.data(), static_cast<int>(exact.size()), names.data(),
-                                      8, &count, codes.data()),
+        EXPECT_EQ(ParseOperatorSearch(exact.data(), static_cast<int>(exact.size()), names.data(), 8,
+                                      &count, codes.data()),
                   1)
             << c.reply;
         ASSERT_EQ(count, static_cast<int>(c.names.size())) << c.reply;

@@ -148,8 +148,7 @@ class SettingsPagesTest : public ::testing::TestWithParam<Dialect> {
 };
 
 INSTANTIATE_TEST_SUITE_P(Dialects, SettingsPagesTest,
-                         ::testing::Values(Dialect::Card, Dialect::Standard),
-                         [](const auto& info) {
+                         ::testing::Values(Dialect::Card, Dialect::Standard), [](const auto& info) {
                              return info.param == Dialect::Card ? "Card" : "Standard";
                          });
 
@@ -162,9 +161,9 @@ TEST_P(SettingsPagesTest, ViewHasNinePagesInOrderAndFollowsTheCard) {
     std::vector<QString> titles;
     for (int i = 0; i < tabs->count(); ++i)
         titles.push_back(tabs->tabText(i));
-    EXPECT_EQ(titles, (std::vector<QString>{"General", "Messages", "Network", "Call Forward",
-                                            "Call Barring", "Security", "Modem", "Call Waiting",
-                                            "Tones"}));
+    EXPECT_EQ(titles,
+              (std::vector<QString>{"General", "Messages", "Network", "Call Forward",
+                                    "Call Barring", "Security", "Modem", "Call Waiting", "Tones"}));
     EXPECT_TRUE(tabs->usesScrollButtons());
     EXPECT_EQ(view.Page(kSettingsNetwork)->objectName(), "SETTINGS_NETWORK_PAGE");
     EXPECT_NE(dynamic_cast<ModemPage*>(view.Page(kSettingsModem)), nullptr);
@@ -176,6 +175,19 @@ TEST_P(SettingsPagesTest, ViewHasNinePagesInOrderAndFollowsTheCard) {
     auto* network = dynamic_cast<NetworkPage*>(view.Page(kSettingsNetwork));
     ASSERT_TRUE(WaitFor([&] { return !network->Busy(); }));
     EXPECT_EQ(network->Operator()->text(), "COSMOTE");
+
+    // Commands from outside pick a page, a row and a button, as taps would.
+    SaveCentre(settings_, 0, CentreEntry{});
+    auto* centres = dynamic_cast<CentrePage*>(view.Page(kSettingsMessages));
+    centres->Load(false);
+    for (int id :
+         {kSettingsPageCommandFirst + kSettingsMessages, kSettingsRowCommandFirst, kCentreSelectId})
+        view.OnMessage(kWmCommand, id, 0);
+    EXPECT_EQ(view.Pages().current, kSettingsMessages);
+    ASSERT_TRUE(WaitFor([&] { return !centres->Busy(); }));
+    EXPECT_EQ(Int(u"SettingsMessagesChosenCenter"), 0);
+    EXPECT_NE(Card("AT+CSCA?\r").find("12345678"), std::string::npos);
+
     state = 1;
     view.OnMessage(kMsgCardStateChanged, 0, 0);
     EXPECT_FALSE(view.isEnabled());
@@ -334,8 +346,9 @@ TEST_P(SettingsPagesTest, CentresPushedToTheCardOnSelectAndSimDefault) {
         EXPECT_NE(Card("AT+CSMP?\r").find(s.csmp), std::string::npos) << s.row;
         EXPECT_EQ(Int(u"SettingsMessagesChosenCenter"), s.row);
         EXPECT_EQ(Int(u"SettingsMessagesUseSIMDefault"), 0);
-        EXPECT_EQ(Column(page.List(), 0, kCentreImageRole),
-                  (std::vector<std::u16string>{s.row == 0 ? u"1" : u"0", s.row == 1 ? u"1" : u"0"}));
+        EXPECT_EQ(
+            Column(page.List(), 0, kCentreImageRole),
+            (std::vector<std::u16string>{s.row == 0 ? u"1" : u"0", s.row == 1 ? u"1" : u"0"}));
     }
 
     // A centre the card refuses leaves the marks and the choice alone.
@@ -358,8 +371,7 @@ TEST_P(SettingsPagesTest, CentresPushedToTheCardOnSelectAndSimDefault) {
     EXPECT_NE(Card("AT+CSCA?\r").find("+CSCA: \"\""), std::string::npos);
     EXPECT_NE(Card("AT+CSMP?\r").find("+CSMP: 167,"), std::string::npos);
     EXPECT_EQ(Int(u"SettingsMessagesUseSIMDefault"), 1);
-    EXPECT_EQ(Column(page.List(), 0, kCentreImageRole),
-              (std::vector<std::u16string>{u"0", u"0"}));
+    EXPECT_EQ(Column(page.List(), 0, kCentreImageRole), (std::vector<std::u16string>{u"0", u"0"}));
 
     // Delete the first: the second moves down, still chosen; a new page pushes it on load
     // once the SIM default is off again.
@@ -380,7 +392,7 @@ TEST_P(SettingsPagesTest, ModemPageWritesTheCommandOnSelectionClickAndLeaving) {
     const auto command = [this] {
         char16_t text[64] = u"";
         return GetSettingString(settings_, u"ATModemCmd", text, 64) ? std::u16string(text)
-                                                                      : u"<none>";
+                                                                    : u"<none>";
     };
     // Stored values out of range: speed 9 reads as 9.6, method 7 checks no button.
     SetSettingInt(settings_, u"SettingsModemSpeed", std::array<int32_t, 1>{9}.data());
@@ -411,9 +423,10 @@ TEST_P(SettingsPagesTest, ModemPageWritesTheCommandOnSelectionClickAndLeaving) {
             page.Speeds()->setCurrentRow(c.speed);
             EXPECT_EQ(command(), c.command);
             EXPECT_EQ(value(), QString::fromStdU16String(c.command).toStdString() + "<cr>");
-            EXPECT_NE(ReadAll(files_.wvdialPath).find(
-                          "Init3 = " + QString::fromStdU16String(c.command).toStdString() + "\n"),
-                      std::string::npos);
+            EXPECT_NE(
+                ReadAll(files_.wvdialPath)
+                    .find("Init3 = " + QString::fromStdU16String(c.command).toStdString() + "\n"),
+                std::string::npos);
             EXPECT_EQ(qobject_cast<QLabel*>(FindControl(&page, kModemDownloadId))->text(),
                       c.download);
             EXPECT_EQ(qobject_cast<QLabel*>(FindControl(&page, kModemUploadId))->text(), c.upload);
