@@ -49,6 +49,7 @@ constexpr char kUsage[] =
     "  --runtime-dir DIR     where the sockets and the driver entry go\n"
     "                        (default $XDG_RUNTIME_DIR/VQMFull)\n"
     "  --help                this text\n"
+    "  --version             the program's version\n"
     "\n"
     "Control commands (also in scripts):\n";
 
@@ -102,6 +103,9 @@ int main(int argc, char** argv) {
         const bool hasValue = i + 1 < argc;
         if (option == "--help" || option == "-h") {
             std::printf("%s%s", kUsage, CardSim::ControlHelp().c_str());
+            return 0;
+        } else if (option == "--version") {
+            std::puts("vqm-cardsim 2.01");
             return 0;
         } else if (option == "ctl") {
             return SendControl(config.runtimeDir, argc, argv, i + 1);

@@ -47,12 +47,17 @@ int PhonebookParseEntryLine(const char* text, const char* end, PhonebookEntry* e
     int32_t value = 0;
     if (!c.NextInt(&value)) return 0;
     entry->index = value;
+    // Each text field is read aside and kept only when whole: a line cut short writes only the
+    // fields it reached.
+    char field[sizeof entry->text + sizeof entry->number] = {};
     int length = 0;
-    if (!c.Comma() || !c.SeekQuoted(entry->number, sizeof entry->number, &length)) return 0;
+    if (!c.Comma() || !c.SeekQuoted(field, sizeof entry->number, &length)) return 0;
+    std::memcpy(entry->number, field, sizeof entry->number);
     entry->numberLength = length;
     if (!c.Comma() || !c.NextInt(&value)) return 0;
     entry->type = value;
-    if (!c.Comma() || !c.SeekQuoted(entry->text, sizeof entry->text, &length)) return 0;
+    if (!c.Comma() || !c.SeekQuoted(field, sizeof entry->text, &length)) return 0;
+    std::memcpy(entry->text, field, sizeof entry->text);
     entry->textLength = length;
     return 1;
 }

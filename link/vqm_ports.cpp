@@ -10,7 +10,13 @@ int main(int argc, char** argv) {
     if (argc > 1 && (std::strcmp(argv[1], "--help") == 0 || std::strcmp(argv[1], "-h") == 0)) {
         std::puts(
             "Usage: vqm-ports\nLists the active serial drivers: key, identity, device.\n"
-            "The card is the first whose identity contains the PnpId setting.");
+            "The card is the first whose identity contains the PnpId setting.\n\n"
+            "  --help      show this text\n"
+            "  --version   show the program's version");
+        return 0;
+    }
+    if (argc > 1 && std::strcmp(argv[1], "--version") == 0) {
+        std::puts("vqm-ports 2.01");
         return 0;
     }
     vqm::SettingsStore settings;

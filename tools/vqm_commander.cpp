@@ -25,7 +25,8 @@ constexpr char kUsage[] =
     "                      (see vqm-dialer --list-ports)\n"
     "  --runtime-dir DIR   where the card manager's socket goes (default\n"
     "                      $XDG_RUNTIME_DIR/VQMFull)\n"
-    "  --help              this text\n";
+    "  --help              this text\n"
+    "  --version           the program's version\n";
 
 }  // namespace
 
@@ -36,6 +37,9 @@ int main(int argc, char** argv) {
         const bool hasValue = i + 1 < argc;
         if (!std::strcmp(argv[i], "--help") || !std::strcmp(argv[i], "-h")) {
             std::fputs(kUsage, stdout);
+            return 0;
+        } else if (!std::strcmp(argv[i], "--version")) {
+            std::puts("vqm-commander 2.01");
             return 0;
         } else if (!std::strcmp(argv[i], "--device") && hasValue) {
             device = argv[++i];

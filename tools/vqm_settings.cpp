@@ -26,6 +26,7 @@ const char kUsage[] =
     "  --db PATH   the store to use (default: $VQM_SETTINGS_DB, else\n"
     "              $XDG_CONFIG_HOME/VQMFull/settings.db)\n"
     "  --help      show this text\n"
+    "  --version   show the program's version\n"
     "\n"
     "A name keeps one type. Without --int or --str, set uses the type the name already has.\n"
     "Integers are 32-bit: -2147483648 to 4294967295 (values above 2147483647 are kept as\n"
@@ -62,6 +63,9 @@ int main(int argc, char** argv) {
         std::string arg = argv[i];
         if (arg == "--help" || arg == "-h") {
             std::fputs(kUsage, stdout);
+            return 0;
+        } else if (arg == "--version") {
+            std::puts("vqm-settings 2.01");
             return 0;
         } else if (arg == "--db") {
             if (i + 1 >= argc) return Fail("--db needs a path");
