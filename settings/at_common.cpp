@@ -17,20 +17,28 @@ struct Reason {
 };
 // The 27.007 codes a person can act on, as its verbose mode words them.
 constexpr Reason kEquipmentReasons[] = {
-    {0, "phone failure"},          {3, "operation not allowed"},
-    {4, "operation not supported"}, {10, "SIM not inserted"},
-    {11, "SIM PIN required"},      {12, "SIM PUK required"},
-    {13, "SIM failure"},           {14, "SIM busy"},
-    {15, "SIM wrong"},             {16, "incorrect password"},
-    {17, "SIM PIN2 required"},     {18, "SIM PUK2 required"},
-    {30, "no network service"},    {31, "network timeout"},
+    {0, "phone failure"},
+    {3, "operation not allowed"},
+    {4, "operation not supported"},
+    {10, "SIM not inserted"},
+    {11, "SIM PIN required"},
+    {12, "SIM PUK required"},
+    {13, "SIM failure"},
+    {14, "SIM busy"},
+    {15, "SIM wrong"},
+    {16, "incorrect password"},
+    {17, "SIM PIN2 required"},
+    {18, "SIM PUK2 required"},
+    {30, "no network service"},
+    {31, "network timeout"},
     {100, "unknown"},
 };
 constexpr Reason kMessageReasons[] = {
-    {302, "operation not allowed"}, {303, "operation not supported"}, {310, "SIM not inserted"},
-    {311, "SIM PIN required"},      {313, "SIM failure"},             {316, "SIM PUK required"},
-    {322, "memory full"},           {330, "SMSC address unknown"},    {331, "no network service"},
-    {500, "unknown error"},
+    {302, "operation not allowed"}, {303, "operation not supported"},
+    {310, "SIM not inserted"},      {311, "SIM PIN required"},
+    {313, "SIM failure"},           {316, "SIM PUK required"},
+    {322, "memory full"},           {330, "SMSC address unknown"},
+    {331, "no network service"},    {500, "unknown error"},
 };
 
 }  // namespace
@@ -51,9 +59,8 @@ int ParseCardError(const char* reply, int length, CardError* error) {
             // A worded report: keep its text up to the line end.
             at.SkipBlanks();
             size_t n = 0;
-            for (const char* p = at.Position(); p < at.End() && *p != '\r' && *p != '\n' &&
-                                                n + 1 < sizeof found.text;
-                 ++p)
+            for (const char* p = at.Position();
+                 p < at.End() && *p != '\r' && *p != '\n' && n + 1 < sizeof found.text; ++p)
                 found.text[n++] = *p;
             found.text[n] = '\0';
         }

@@ -21,8 +21,8 @@ constexpr int kAllBarrings = 5;
 constexpr char kClckTag[] = "+CLCK:";
 constexpr size_t kPasswordSize = 32;
 
-int SendLockCommand(Link& link, int facility, int mode, const char16_t* password,
-                    int serviceClass, CardError* error) {
+int SendLockCommand(Link& link, int facility, int mode, const char16_t* password, int serviceClass,
+                    CardError* error) {
     char narrow[kPasswordSize] = "";
     if (password) WideToNarrowBounded(password, narrow, sizeof narrow);
     if (!settings_detail::Quotable(narrow)) return -1;

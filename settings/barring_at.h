@@ -15,11 +15,11 @@ const char* BarringFacility(int facility);
 
 // "AT+CLCK=<fac>,2": 1 when the reported class shares a bit with serviceClass, 0 when it does
 // not or the status is 0; without "+CLCK:" the reply's final result code (so ERROR and a
-// "+CME ERROR" show as 4, never as "not barred"). -1 for a class outside 1..4 or a facility outside 0..7.
+// "+CME ERROR" show as 4, never as "not barred"). -1 for a class outside 1..4 or a facility outside
+// 0..7.
 int QueryBarring(Link& link, int serviceClass, int facility, CardError* error = nullptr);
 // The query reply's scan on its own (a status of 1 without a class counts as barred).
-int ParseBarringReply(const char* reply, int length, int serviceClass,
-                      CardError* error = nullptr);
+int ParseBarringReply(const char* reply, int length, int serviceClass, CardError* error = nullptr);
 
 // "AT+CLCK=<fac>,1,<password>,<class>" for facilities 0..4. The final result code, -1 when no
 // reply came; a password holding a quote or a control character sends nothing and returns -1.

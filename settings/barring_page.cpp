@@ -20,9 +20,9 @@ constexpr char16_t kTitle[] = u"VQM Dialer";
 constexpr const char* kClassTitles[BarringPage::kClasses] = {"Voice", "Data", "Fax"};
 // The names that fill the "%s" of the failure messages.
 constexpr const char16_t* kClassNames[BarringPage::kClasses] = {u"voice", u"data", u"fax"};
-constexpr const char* kPageClasses[BarringPage::kClasses] = {
-    "SETTINGS_CALLBARRING_VOICE_PAGE", "SETTINGS_CALLBARRING_DATA_PAGE",
-    "SETTINGS_CALLBARRING_FAX_PAGE"};
+constexpr const char* kPageClasses[BarringPage::kClasses] = {"SETTINGS_CALLBARRING_VOICE_PAGE",
+                                                             "SETTINGS_CALLBARRING_DATA_PAGE",
+                                                             "SETTINGS_CALLBARRING_FAX_PAGE"};
 constexpr int kMargin = 5, kButtonHeight = 20, kStep = 22, kMarkWidth = 14, kLabelHeight = 16;
 constexpr int kAllOutgoing = 6, kAllIncoming = 7, kAllBarrings = 5;
 
@@ -232,10 +232,10 @@ void BarringPage::Lift(int index, int buttonId) {
         },
         [this, index, facility, error](int result) {
             if (!CardFailed(result)) return Request(index);
-            const char16_t* format = facility == kAllOutgoing ? u"Cannot disable %s outgoing barring."
-                                     : facility == kAllIncoming
-                                         ? u"Cannot disable %s incoming barring."
-                                         : u"Cannot disable all %s barring.";
+            const char16_t* format =
+                facility == kAllOutgoing   ? u"Cannot disable %s outgoing barring."
+                : facility == kAllIncoming ? u"Cannot disable %s incoming barring."
+                                           : u"Cannot disable all %s barring.";
             Box(WithReason(Fill(format, kClassNames[index]), *error), kMbIconStop);
         });
 }

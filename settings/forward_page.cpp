@@ -28,9 +28,9 @@ constexpr char16_t kNotActive[] = u"NOT ACTIVE";
 constexpr char16_t kUnknown[] = u"Unknown";
 constexpr const char* kRowLabels[4] = {"All Calls:", "If Busy:", "Unanswered:", "Not Reachable:"};
 constexpr const char* kClassNames[ForwardPage::kClasses] = {"Voice", "Data", "Fax"};
-constexpr const char* kPageClasses[ForwardPage::kClasses] = {
-    "SETTINGS_CALLFORWARD_VOICE_PAGE", "SETTINGS_CALLFORWARD_DATA_PAGE",
-    "SETTINGS_CALLFORWARD_FAX_PAGE"};
+constexpr const char* kPageClasses[ForwardPage::kClasses] = {"SETTINGS_CALLFORWARD_VOICE_PAGE",
+                                                             "SETTINGS_CALLFORWARD_DATA_PAGE",
+                                                             "SETTINGS_CALLFORWARD_FAX_PAGE"};
 constexpr int kRowHeight = 20, kRowStep = 26, kMargin = 5, kLabelWidth = 100;
 
 QString Q(const std::u16string& text) {
@@ -102,8 +102,8 @@ void CardJobs::Run(std::function<int(Link&)> exchange, std::function<void(int)> 
 
 // ForwardDialog
 
-ForwardDialog::ForwardDialog(QWidget* parent, SettingsStore& settings, int serviceClass,
-                             int reason, const QString& rowText)
+ForwardDialog::ForwardDialog(QWidget* parent, SettingsStore& settings, int serviceClass, int reason,
+                             const QString& rowText)
     : QDialog(parent), settings_(settings), serviceClass_(serviceClass), reason_(reason) {
     setObjectName("FORWARD_REQUEST_DIALOG");
     setWindowTitle("Forward Request");
@@ -222,8 +222,7 @@ void ForwardPage::BuildSubPage(View* page, int index) {
     SetControlId(request, kForwardRequestId);
     request->setGeometry(kMargin, top, width - 2 * kMargin, kRowHeight);
     QObject::connect(request, &QPushButton::clicked, this, [this, index] { Request(index); });
-    auto* off =
-        new QPushButton(QString("Deactivate All %1 Forward").arg(kClassNames[index]), page);
+    auto* off = new QPushButton(QString("Deactivate All %1 Forward").arg(kClassNames[index]), page);
     SetControlId(off, kForwardDeactivateClassId);
     off->setGeometry(kMargin, top + 25, width - 2 * kMargin, kRowHeight);
     QObject::connect(off, &QPushButton::clicked, this, [this, index] { DeactivateClass(index); });
@@ -258,10 +257,10 @@ void ForwardPage::Request(int index) {
             [this, index, reason, number](int result) {
                 State(index, reason)
                     ->setText(result == 1 ? Q(*number) : Q(result == 0 ? kNotActive : kUnknown));
-                LogShown(context_, "settings-forward",
-                         QString("%1 %2 %3")
-                             .arg(kClassNames[index], kRowLabels[reason],
-                                  State(index, reason)->text()));
+                LogShown(
+                    context_, "settings-forward",
+                    QString("%1 %2 %3")
+                        .arg(kClassNames[index], kRowLabels[reason], State(index, reason)->text()));
                 // Unconditional forwarding takes every call, so the conditional ones do not
                 // apply while it is on.
                 if (reason == kForwardUnconditional && (result == 0 || result == 1))
@@ -287,8 +286,8 @@ void ForwardPage::OpenRow(int index, int reason) {
         [=, this](int result) {
             if (CardFailed(result)) return;  // the row keeps its text
             if (activate)
-                SetSettingString(context_.settings,
-                                 StoredNumberName(serviceClass, reason).c_str(), number.c_str());
+                SetSettingString(context_.settings, StoredNumberName(serviceClass, reason).c_str(),
+                                 number.c_str());
             State(index, reason)->setText(activate ? Q(number) : Q(kNotActive));
         });
 }

@@ -118,8 +118,10 @@ SecurityPage::SecurityPage(QWidget* parent, ShellContext& context)
         std::function<void()> run;
     };
     const Action actions[] = {
-        {kPhoneLockOnId, [this] { PhoneLock(1); }},  {kPhoneLockOffId, [this] { PhoneLock(0); }},
-        {kPinRequestOnId, [this] { PinRequest(1); }}, {kPinRequestOffId, [this] { PinRequest(0); }},
+        {kPhoneLockOnId, [this] { PhoneLock(1); }},
+        {kPhoneLockOffId, [this] { PhoneLock(0); }},
+        {kPinRequestOnId, [this] { PinRequest(1); }},
+        {kPinRequestOffId, [this] { PinRequest(0); }},
         {kRequestStatusId, [this] { RequestStatus(); }},
         {kChangeCodeId, [this] { ChangeAccessCode(); }},
     };
@@ -151,9 +153,10 @@ void SecurityPage::Mark(int onId, int offId, int state) {
     Button(onId)->setChecked(state == 1);
     Button(offId)->setChecked(state == 0);
     LogShown(context_, "settings-security",
-             QString("%1 %2")
-                 .arg(onId == kPinRequestOnId ? "pin-request" : "phone-lock",
-                      state == 1 ? "on" : state == 0 ? "off" : "unknown"));
+             QString("%1 %2").arg(onId == kPinRequestOnId ? "pin-request" : "phone-lock",
+                                  state == 1   ? "on"
+                                  : state == 0 ? "off"
+                                               : "unknown"));
 }
 
 void SecurityPage::PinRequest(int mode) {
@@ -201,8 +204,7 @@ void SecurityPage::RequestStatus() {
                   [this, pair, error](int result) {
                       Mark(pair.onId, pair.offId, result);
                       // A blocked SIM and a card that went away are told, not just unmarked.
-                      if (result != 0 && result != 1)
-                          Box(WithReason(u"Request error", *error));
+                      if (result != 0 && result != 1) Box(WithReason(u"Request error", *error));
                   });
     }
 }

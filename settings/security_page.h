@@ -23,8 +23,7 @@ inline constexpr int kSingleCodeEditId = 1172, kChangeListId = 1173, kOldCodeEdi
 // Dialog 134 ("PIN Code Request", "PIN Code:") or 136 ("Change Phone Lock", "Security Code:").
 class CodeDialog : public QDialog {
   public:
-    CodeDialog(QWidget* parent, const char* objectName, const QString& title,
-               const QString& label);
+    CodeDialog(QWidget* parent, const char* objectName, const QString& title, const QString& label);
     QLineEdit* Code() const { return code_; }
 
   private:

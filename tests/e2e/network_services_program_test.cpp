@@ -7,8 +7,8 @@
 
 #include <chrono>
 #include <filesystem>
-#include <functional>
 #include <fstream>
+#include <functional>
 #include <sstream>
 #include <string>
 
@@ -47,15 +47,15 @@ class NetworkServicesProgramTest : public ::testing::TestWithParam<const char*> 
     }
 
     std::string Environment() const {
-        return "env XDG_RUNTIME_DIR=" + temp_.Path() + "/xdg VQM_SETTINGS_DB=" +
-               (temp_ / "settings.db") + " XDG_DATA_HOME=" + (temp_ / "data") +
-               " XDG_CONFIG_HOME=" + (temp_ / "config") +
+        return "env XDG_RUNTIME_DIR=" + temp_.Path() +
+               "/xdg VQM_SETTINGS_DB=" + (temp_ / "settings.db") +
+               " XDG_DATA_HOME=" + (temp_ / "data") + " XDG_CONFIG_HOME=" + (temp_ / "config") +
                " QT_QPA_PLATFORM=offscreen DBUS_SESSION_BUS_ADDRESS=unix:path=/nonexistent ";
     }
     void Start() {
         card_.Start(Environment() + VQM_CARDSIM + " --dialect " + GetParam() +
-                    " --powered --state-dir " + (temp_ / "state") + " >" +
-                    (temp_ / "cardsim.out") + " 2>&1");
+                    " --powered --state-dir " + (temp_ / "state") + " >" + (temp_ / "cardsim.out") +
+                    " 2>&1");
         ASSERT_TRUE(
             WaitFor([&] { return ServerAnswers(WindowSocketPath(run_, kCompanionClass)); }));
         dialer_.Start(Environment() + VQM_DIALER + " --ui-log " + (temp_ / "ui.log") +
@@ -136,8 +136,9 @@ TEST_P(NetworkServicesProgramTest, InternationalCallsBarredWithTheRightPasswordO
     EXPECT_TRUE(CardKeeps("net-barring OI 1\n")) << Read(temp_ / "state/card.state");
     EXPECT_TRUE(Shows("settings-barring Voice International barred")) << Log();
     ASSERT_TRUE(TapWithDialog(kBarAllOutgoing, "ENTER_ACCESS_CODE_DIALOG 1171=1111"));
-    EXPECT_TRUE(Shows("box VQM Dialer: Activation Error! / Please check your password. / "
-                      "incorrect password -> OK"))
+    EXPECT_TRUE(
+        Shows("box VQM Dialer: Activation Error! / Please check your password. / "
+              "incorrect password -> OK"))
         << Log();
     EXPECT_TRUE(CardKeeps("net-barring AO 0\n"));
 }
@@ -147,7 +148,8 @@ TEST_P(NetworkServicesProgramTest, PinRequestOnPinChangedThenThreeWrongPinsBlock
     Tap(kPageSecurity);
     ASSERT_TRUE(TapWithDialog(kPinRequestOn, "PIN_CODE_REQUEST_DIALOG 1172=1234"));
     ASSERT_TRUE(Shows("settings-security pin-request on")) << Log();
-    ASSERT_TRUE(TapWithDialog(kChangeCode, "CHANGE_ACCESS_CODE_DIALOG 1174=1234 1175=4321 1176=4321"));
+    ASSERT_TRUE(
+        TapWithDialog(kChangeCode, "CHANGE_ACCESS_CODE_DIALOG 1174=1234 1175=4321 1176=4321"));
     EXPECT_TRUE(CardKeeps("net-password SC 4321\n")) << Read(temp_ / "state/card.state");
 
     const std::string failed = "box VQM Dialer: Cannot change PIN Lock status! / ";

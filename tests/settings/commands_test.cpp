@@ -4,8 +4,8 @@
 
 #include <chrono>
 #include <cstring>
-#include <iterator>
 #include <functional>
+#include <iterator>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -214,7 +214,8 @@ TEST_F(CommandsTest, CardRefusalsAreFailuresWithTheirReason) {
         {"AT+CLCK=\"AB\",0,\"0000\",7",
          [&](CardError* e) { return UnlockAllBarrings(*link_, u"0000", e); }},
         {"AT+CLCK=\"SC\",2", [&](CardError* e) { return QueryLock(*link_, 0, e); }},
-        {"AT+CLCK=\"SC\",1,\"1234\",7", [&](CardError* e) { return SetLock(*link_, 0, 1, u"1234", e); }},
+        {"AT+CLCK=\"SC\",1,\"1234\",7",
+         [&](CardError* e) { return SetLock(*link_, 0, 1, u"1234", e); }},
         {"AT+CPWD=\"SC\",\"1234\",\"4321\",7",
          [&](CardError* e) { return ChangeCode(*link_, 0, u"1234", u"4321", e); }},
     };
@@ -260,8 +261,7 @@ TEST(CardErrorTest, ReplyResultAndReason) {
     for (const Case& c : cases) {
         CardError error;
         error.kind = CardError::Message;  // stale: the reading must clear it
-        EXPECT_EQ(SettingsResult(c.reply, static_cast<int>(std::strlen(c.reply)), &error),
-                  c.result)
+        EXPECT_EQ(SettingsResult(c.reply, static_cast<int>(std::strlen(c.reply)), &error), c.result)
             << c.reply;
         EXPECT_STREQ(CardErrorReason(error), c.reason) << c.reply;
     }

@@ -172,10 +172,10 @@ TEST_F(NetworkServicesTest, SimLocksAndCodeChanges) {
 // network side resets the SIM.
 TEST_F(NetworkServicesTest, WrongPinsBlockTheSimUntilItIsReset) {
     struct Case {
-        const char* wrong;   // a command with a wrong code
-        const char* right;   // the same with the right one
-        const char* query;   // what the blocked code refuses as well
-        const char* puk;     // the blocked code's answer
+        const char* wrong;  // a command with a wrong code
+        const char* right;  // the same with the right one
+        const char* query;  // what the blocked code refuses as well
+        const char* puk;    // the blocked code's answer
         int pin;
     };
     const Case cases[] = {

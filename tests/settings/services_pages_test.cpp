@@ -127,8 +127,7 @@ class ServicesPagesTest : public ::testing::TestWithParam<Dialect> {
             std::ifstream file(temp_ / "card.state");
             std::stringstream text;
             text << file.rdbuf();
-            if ((("\n" + text.str()).find("\n" + line) != std::string::npos) == wanted)
-                return true;
+            if ((("\n" + text.str()).find("\n" + line) != std::string::npos) == wanted) return true;
             std::this_thread::yield();
         } while (Clock::now() < deadline);
         return false;
@@ -163,10 +162,14 @@ TEST_P(ServicesPagesTest, ForwardRequestShowsEachReasonAndGreysTheConditionalRow
         bool conditionalEnabled;
     };
     const Case cases[] = {
-        {"forward 0 1 on +441234567890", 0,
-         {u"+441234567890", u"NOT ACTIVE", u"NOT ACTIVE", u"NOT ACTIVE"}, false},
-        {"forward 0 1 on +441234567890", 1,
-         {u"NOT ACTIVE", u"NOT ACTIVE", u"NOT ACTIVE", u"NOT ACTIVE"}, true},
+        {"forward 0 1 on +441234567890",
+         0,
+         {u"+441234567890", u"NOT ACTIVE", u"NOT ACTIVE", u"NOT ACTIVE"},
+         false},
+        {"forward 0 1 on +441234567890",
+         1,
+         {u"NOT ACTIVE", u"NOT ACTIVE", u"NOT ACTIVE", u"NOT ACTIVE"},
+         true},
         {"forward 1 2 on 0123", 1, {u"NOT ACTIVE", u"0123", u"NOT ACTIVE", u"NOT ACTIVE"}, true},
         // One forward for all three classes shows on each sub-page.
         {"forward 3 7 on 0999", 2, {u"NOT ACTIVE", u"NOT ACTIVE", u"NOT ACTIVE", u"0999"}, true},
@@ -202,10 +205,10 @@ TEST_P(ServicesPagesTest, ForwardDialogSendsTheChoiceAndTheRowFollows) {
         int reason;
         Choice choice;
         const char16_t* number;
-        int timeIndex;         // -1 leaves "20"
-        const char* state;     // the card's kept forward afterwards ("" none), or gone
-        const char16_t* row;   // the row's text afterwards
-        bool stored;           // the number is kept as the last one used
+        int timeIndex;        // -1 leaves "20"
+        const char* state;    // the card's kept forward afterwards ("" none), or gone
+        const char16_t* row;  // the row's text afterwards
+        bool stored;          // the number is kept as the last one used
     };
     const Case cases[] = {
         {1, Activate, u"+441234567890", 2, "net-forward 1 1 +441234567890 145 20 1",
@@ -324,22 +327,37 @@ TEST_P(ServicesPagesTest, BarringAsksThePasswordAndShowsEachFacility) {
     const Case cases[] = {
         {0, kBarInternationalId, "0000", {}, "net-barring OI 1"},
         {1, kBarRoamingId, "0000", {}, "net-barring IR 2"},
-        {2, kBarAllOutgoingId, "1111", {std::u16string(kActivationError) + u"\nincorrect password"},
+        {2,
+         kBarAllOutgoingId,
+         "1111",
+         {std::u16string(kActivationError) + u"\nincorrect password"},
          "net-barring AO 0"},
         // Never sent: the card's state would change or refuse, and no exchange starts.
         {0, kBarAllIncomingId, "000", {length}, "net-barring AI 0"},
         {0, kBarAllIncomingId, "00000", {length}, "net-barring AI 0"},
-        {0, kBarAllIncomingId, "0000000000000000000000000000000000000000", {length},
+        {0,
+         kBarAllIncomingId,
+         "0000000000000000000000000000000000000000",
+         {length},
          "net-barring AI 0"},
         {0, kBarAllIncomingId, "00a0", {digits}, "net-barring AI 0"},
         {0, kBarAllIncomingId, "0 00", {digits}, "net-barring AI 0"},
         {0, kBarAllIncomingId, "0\"00", {digits}, "net-barring AI 0"},
         {0, kLiftOutgoingId, "12", {length}, "net-barring OI 1"},
-        {0, kLiftOutgoingId, "1111",
-         {u"Cannot disable voice outgoing barring.\nincorrect password"}, "net-barring OI 1"},
-        {1, kLiftIncomingId, "1111",
-         {u"Cannot disable data incoming barring.\nincorrect password"}, "net-barring IR 2"},
-        {2, kLiftClassId, "1111", {u"Cannot disable all fax barring.\nincorrect password"},
+        {0,
+         kLiftOutgoingId,
+         "1111",
+         {u"Cannot disable voice outgoing barring.\nincorrect password"},
+         "net-barring OI 1"},
+        {1,
+         kLiftIncomingId,
+         "1111",
+         {u"Cannot disable data incoming barring.\nincorrect password"},
+         "net-barring IR 2"},
+        {2,
+         kLiftClassId,
+         "1111",
+         {u"Cannot disable all fax barring.\nincorrect password"},
          "net-barring OI 1"},
         {0, kLiftOutgoingId, "0000", {}, "net-barring OI 0"},
     };
@@ -385,7 +403,8 @@ TEST_P(ServicesPagesTest, BarringRequestMarksAndDisableAll) {
     AnswerCode(kPasswordEditId, "1234");
     Click(page, kLiftAllBarringsId);
     Settle(page->Jobs());
-    EXPECT_EQ(TakeBoxes(), std::vector<std::u16string>{u"Cannot disable all barring.\nincorrect password"});
+    EXPECT_EQ(TakeBoxes(),
+              std::vector<std::u16string>{u"Cannot disable all barring.\nincorrect password"});
     AnswerCode(kPasswordEditId, "0000");
     Click(page, kLiftAllBarringsId);
     Settle(page->Jobs());
@@ -448,8 +467,8 @@ TEST_P(ServicesPagesTest, ChangeAccessCodeChecksInOrderBeforeTheCard) {
         Click(page, kChangeCodeId);
         EXPECT_EQ(page->Jobs().Pending() > 0, c.sent) << c.newCode;
         Settle(page->Jobs());
-        EXPECT_EQ(TakeBoxes(), c.box ? std::vector<std::u16string>{c.box}
-                                     : std::vector<std::u16string>{})
+        EXPECT_EQ(TakeBoxes(),
+                  c.box ? std::vector<std::u16string>{c.box} : std::vector<std::u16string>{})
             << c.which << " " << c.newCode;
     }
     EXPECT_TRUE(StateHas("net-password P2 8765"));
@@ -488,10 +507,20 @@ TEST_P(ServicesPagesTest, PinRequestLockStatusAndABlockedSim) {
     const std::u16string lockFail = u"Cannot change Phone Lock status!";
     const Step steps[] = {
         {kRequestStatusId, 0, nullptr, {}, 0, 0},
-        {kPinRequestOnId, kSingleCodeEditId, "123456789", {u"Password length must between 1 and 8!"}, 0, 0},
+        {kPinRequestOnId,
+         kSingleCodeEditId,
+         "123456789",
+         {u"Password length must between 1 and 8!"},
+         0,
+         0},
         {kPinRequestOnId, kSingleCodeEditId, "1234", {}, 1, 0},
         {kPhoneLockOnId, kSingleCodeEditId, "1234", {u"Password must be 5 digits long!"}, 1, 0},
-        {kPhoneLockOnId, kSingleCodeEditId, "12a45", {u"A code may hold digits only (0 to 9)."}, 1, 0},
+        {kPhoneLockOnId,
+         kSingleCodeEditId,
+         "12a45",
+         {u"A code may hold digits only (0 to 9)."},
+         1,
+         0},
         {kPhoneLockOnId, kSingleCodeEditId, "11111", {lockFail + u"\nincorrect password"}, 1, 0},
         {kPhoneLockOnId, kSingleCodeEditId, "12345", {}, 1, 1},
         {kPinRequestOffId, kSingleCodeEditId, "0000", {pinFail + u"\nincorrect password"}, 1, 1},
@@ -556,8 +585,7 @@ TEST_P(ServicesPagesTest, PulledCardWhileWaiting) {
 }
 
 INSTANTIATE_TEST_SUITE_P(BothPersonalities, ServicesPagesTest,
-                         ::testing::Values(Dialect::Card, Dialect::Standard),
-                         [](const auto& info) {
+                         ::testing::Values(Dialect::Card, Dialect::Standard), [](const auto& info) {
                              return info.param == Dialect::Card ? "Card" : "Standard";
                          });
 
