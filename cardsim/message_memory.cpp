@@ -25,6 +25,8 @@ constexpr const char* kBadTextParameter = "+CMS ERROR: 305";
 constexpr const char* kInvalidIndex = "+CMS ERROR: 321";
 constexpr const char* kMemoryFull = "+CMS ERROR: 322";
 constexpr const char* kCentreUnknown = "+CMS ERROR: 330";
+// The service centre stored on the simulated SIM.
+constexpr const char* kSimCentre = "+3097100000";
 
 constexpr int kMaxCapacity = 255;
 
@@ -695,7 +697,8 @@ Handled MessageMemory::CentreCommand(const std::string& args, bool query, std::s
         (!fields[0].text.empty() && !IsDialNumber(fields[0].text)) ||
         (fields.size() == 2 && !Number(fields[1], 0, 255, &type)))
         return Handled::Error;
-    centre_ = fields[0].text;
+    // An empty number goes back to the centre the SIM itself holds, as "Use SIM Default" expects.
+    centre_ = fields[0].text.empty() ? kSimCentre : fields[0].text;
     if (type == 145 && !centre_.empty() && centre_[0] != '+') centre_.insert(0, "+");
     centreType_ = !centre_.empty() && centre_[0] == '+' ? 145 : 129;
     Change();
@@ -833,7 +836,7 @@ bool MessageMemory::Load(const std::string& name, const std::string& rest) {
 }
 
 void MessageMemory::FillDemo() {
-    centre_ = "+3097100000";
+    centre_ = kSimCentre;
     centreType_ = 145;
     const std::string centre = EncodeAddress(centre_, true);
     struct Demo {

@@ -197,14 +197,18 @@ void SecurityPage::RequestStatus() {
     struct Pair {
         int lock, onId, offId;
     };
+    // One tap is told of at most once, though both queries may fail (a card that went away).
+    auto told = std::make_shared<bool>(false);
     for (const Pair& pair : {Pair{kSecurityCode, kPhoneLockOnId, kPhoneLockOffId},
                              Pair{kPin, kPinRequestOnId, kPinRequestOffId}}) {
         auto error = std::make_shared<CardError>();
         jobs_.Run([=](Link& link) { return QueryLock(link, pair.lock, error.get()); },
-                  [this, pair, error](int result) {
+                  [this, pair, error, told](int result) {
                       Mark(pair.onId, pair.offId, result);
                       // A blocked SIM and a card that went away are told, not just unmarked.
-                      if (result != 0 && result != 1) Box(WithReason(u"Request error", *error));
+                      if (result == 0 || result == 1 || *told) return;
+                      *told = true;
+                      Box(WithReason(u"Request error", *error));
                   });
     }
 }

@@ -79,7 +79,10 @@ TEST_F(MessageMemoryTest, StorageFormatAndErrors) {
 
     // Sending needs a centre, from the PDU or the card; a received message is not sent.
     EXPECT_EQ(Send("AT+CMSS=1\r"), "\r\n+CMS ERROR: 330\r\n");
-    EXPECT_EQ(Send("AT+CSCA=\"+3097100000\",145\r"), "\r\nOK\r\n");
+    EXPECT_EQ(Send("AT+CSCA=\"+4412\",145\r"), "\r\nOK\r\n");
+    EXPECT_EQ(Send("AT+CSCA?\r"), "\r\n+CSCA: \"+4412\",145\r\n\r\nOK\r\n");
+    // An empty number is the SIM's own centre again.
+    EXPECT_EQ(Send("AT+CSCA=\"\"\r"), "\r\nOK\r\n");
     EXPECT_EQ(Send("AT+CSCA?\r"), "\r\n+CSCA: \"+3097100000\",145\r\n\r\nOK\r\n");
     EXPECT_EQ(Send("AT+CMSS=1\r"), "\r\n+CMSS: 0\r\n\r\nOK\r\n");
     EXPECT_EQ(Send("AT+CMSS=2\r"), "\r\n+CMS ERROR: 302\r\n");

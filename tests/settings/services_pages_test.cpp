@@ -582,6 +582,12 @@ TEST_P(ServicesPagesTest, PulledCardWhileWaiting) {
     Settle(page->Jobs());
     watch.join();
     EXPECT_EQ(TakeBoxes(), std::vector<std::u16string>{u"Cannot change PIN Lock status!"});
+    // Both states unknown now: told once, and neither button of either pair is pressed.
+    Click(page, kRequestStatusId);
+    Settle(page->Jobs());
+    EXPECT_EQ(TakeBoxes(), std::vector<std::u16string>{u"Request error"});
+    for (int id : {kPhoneLockOnId, kPhoneLockOffId, kPinRequestOnId, kPinRequestOffId})
+        EXPECT_FALSE(page->Button(id)->isChecked()) << id;
 }
 
 INSTANTIATE_TEST_SUITE_P(BothPersonalities, ServicesPagesTest,
