@@ -35,7 +35,9 @@ namespace fs = std::filesystem;
 
 constexpr size_t kFeedKeep = 200;
 
-Result Fail(int code, const std::string& text) { return Result{code, "", text + "\n"}; }
+Result Fail(int code, const std::string& text) {
+    return Result{code, "", text + "\n"};
+}
 
 // ---- text helpers ----
 
@@ -54,11 +56,21 @@ std::string Json(const std::string& text) {
     std::string out = "\"";
     for (unsigned char c : text) {
         switch (c) {
-            case '"': out += "\\\""; break;
-            case '\\': out += "\\\\"; break;
-            case '\n': out += "\\n"; break;
-            case '\r': out += "\\r"; break;
-            case '\t': out += "\\t"; break;
+            case '"':
+                out += "\\\"";
+                break;
+            case '\\':
+                out += "\\\\";
+                break;
+            case '\n':
+                out += "\\n";
+                break;
+            case '\r':
+                out += "\\r";
+                break;
+            case '\t':
+                out += "\\t";
+                break;
             default:
                 if (c < 0x20) {
                     char code[8];
@@ -98,8 +110,10 @@ struct PageName {
     const char* name;
     int page;
 };
-constexpr PageName kPages[] = {{"inbox", kPageInbox}, {"outbox", kPageOutbox},
-                               {"sent", kPageSent},   {"draft", kPageDraft},
+constexpr PageName kPages[] = {{"inbox", kPageInbox},
+                               {"outbox", kPageOutbox},
+                               {"sent", kPageSent},
+                               {"draft", kPageDraft},
                                {"pc", kPagePda}};
 
 const char* PageNameOf(int page) {
@@ -169,7 +183,8 @@ bool ReadBook(const Split& split, bool desktopAllowed, Book* book, std::string* 
             return false;
         }
         if (*book != Book::All && *book != chosen) {
-            *error = "choose one of --sim, --card" + std::string(desktopAllowed ? ", --desktop" : "");
+            *error =
+                "choose one of --sim, --card" + std::string(desktopAllowed ? ", --desktop" : "");
             return false;
         }
         *book = chosen;
@@ -183,12 +198,23 @@ std::string Escape(const std::string& text) {
     std::string out = ":";
     for (char c : text) {
         switch (c) {
-            case '\\': out += "\\\\"; break;
-            case ' ': out += "\\s"; break;
-            case '\n': out += "\\n"; break;
-            case '\r': out += "\\r"; break;
-            case '\t': out += "\\t"; break;
-            default: out += c;
+            case '\\':
+                out += "\\\\";
+                break;
+            case ' ':
+                out += "\\s";
+                break;
+            case '\n':
+                out += "\\n";
+                break;
+            case '\r':
+                out += "\\r";
+                break;
+            case '\t':
+                out += "\\t";
+                break;
+            default:
+                out += c;
         }
     }
     return out;
@@ -204,12 +230,23 @@ bool Unescape(const std::string& field, std::string* out) {
         }
         if (++i >= field.size()) return false;
         switch (field[i]) {
-            case '\\': out->push_back('\\'); break;
-            case 's': out->push_back(' '); break;
-            case 'n': out->push_back('\n'); break;
-            case 'r': out->push_back('\r'); break;
-            case 't': out->push_back('\t'); break;
-            default: return false;
+            case '\\':
+                out->push_back('\\');
+                break;
+            case 's':
+                out->push_back(' ');
+                break;
+            case 'n':
+                out->push_back('\n');
+                break;
+            case 'r':
+                out->push_back('\r');
+                break;
+            case 't':
+                out->push_back('\t');
+                break;
+            default:
+                return false;
         }
     }
     return true;
@@ -248,16 +285,22 @@ bool ReadStorage(Link& link, int storage, std::vector<PhonebookEntry>* entries, 
     return true;
 }
 
-const char* BookName(int storage) { return storage == kStorageSimCard ? "sim" : "card"; }
+const char* BookName(int storage) {
+    return storage == kStorageSimCard ? "sim" : "card";
+}
 
 // ---- the commands ----
 
 std::string PowerText(long state) {
     switch (state) {
-        case 0: return "down";
-        case 1: return "ready";
-        case 2: return "powering up";
-        default: return "unknown";
+        case 0:
+            return "down";
+        case 1:
+            return "ready";
+        case 2:
+            return "powering up";
+        default:
+            return "unknown";
     }
 }
 
@@ -304,10 +347,14 @@ Result Status(Context& context, bool json) {
 
 std::string CallText(int result) {
     switch (result) {
-        case 0: return "Voice call";
-        case 7: return "Number is busy";
-        case 8: return "Number not answer";
-        default: return "Call could not be established";
+        case 0:
+            return "Voice call";
+        case 7:
+            return "Number is busy";
+        case 8:
+            return "Number not answer";
+        default:
+            return "Call could not be established";
     }
 }
 
@@ -336,8 +383,8 @@ Result Simple(bool ok, bool json, const std::string& done, const std::string& fa
     Result result;
     result.code = ok ? kExitDone : kExitRefused;
     if (json)
-        result.out = JsonObject({{"ok", ok ? "true" : "false"}, {"text", Json(ok ? done : failed)}}) +
-                     "\n";
+        result.out =
+            JsonObject({{"ok", ok ? "true" : "false"}, {"text", Json(ok ? done : failed)}}) + "\n";
     else if (ok)
         result.out = done + "\n";
     else
@@ -406,7 +453,8 @@ Result SmsList(Context& context, const Command& command) {
         result.out += head + Utf16ToUtf8(row.date) + "  " + Utf16ToUtf8(row.from) + "  " +
                       Utf16ToUtf8(row.preview) + "\n";
     }
-    if (rows.empty()) result.out = std::string("No messages in ") + PageNameOf(command.page) + ".\n";
+    if (rows.empty())
+        result.out = std::string("No messages in ") + PageNameOf(command.page) + ".\n";
     return result;
 }
 
@@ -434,9 +482,7 @@ Result SmsDelete(Context& context, const Command& command) {
                                     PageNameOf(command.page) + ".");
     std::string box;
     FolderUi ui;
-    ui.box = [&box](const std::u16string& text, const std::u16string&) {
-        box = Utf16ToUtf8(text);
-    };
+    ui.box = [&box](const std::u16string& text, const std::u16string&) { box = Utf16ToUtf8(text); };
     std::function<void()> cleared = [&context] {
         if (!context.companionPath.empty())
             SendWindowMessage(context.companionPath, kMsgSimFullCleared, 0, 0, 2000);
@@ -582,7 +628,8 @@ Result ContactsExport(Context& context, const Command& command) {
                                  {"contacts", std::to_string(entries.size())}}) +
                      "\n";
     else
-        result.out = std::to_string(entries.size()) + " contacts written to " + command.file + ".\n";
+        result.out =
+            std::to_string(entries.size()) + " contacts written to " + command.file + ".\n";
     return result;
 }
 
@@ -736,11 +783,13 @@ int ParseCommand(const std::vector<std::string>& args, Command* command, std::st
     if (verb == "dial") {
         if (operands.size() != 1 || !split.options.empty()) return usage("dial takes one NUMBER");
         const std::string& number = operands[0];
-        const bool ok = !number.empty() && number.size() <= 19 &&
-                        std::all_of(number.begin(), number.end(), [](char c) {
+        const bool ok =
+            !number.empty() && number.size() <= 19 &&
+            std::all_of(number.begin(), number.end(),
+                        [](char c) {
                             return (c >= '0' && c <= '9') || c == '*' || c == '#' || c == '+';
                         }) &&
-                        number.find('+', 1) == std::string::npos;
+            number.find('+', 1) == std::string::npos;
         if (!ok) return usage("not a number to dial: \"" + number + "\"");
         command->verb = Verb::Dial;
         command->number = number;
@@ -820,12 +869,24 @@ int ParseCommand(const std::vector<std::string>& args, Command* command, std::st
 std::vector<std::string> CommandArguments(const Command& command) {
     std::vector<std::string> args;
     switch (command.verb) {
-        case Verb::Status: args = {"status"}; break;
-        case Verb::Dial: args = {"dial", command.number}; break;
-        case Verb::HangUp: args = {"hangup"}; break;
-        case Verb::Answer: args = {"answer"}; break;
-        case Verb::Events: args = {"events"}; break;
-        case Verb::SmsList: args = {"sms", "list", "--folder", PageNameOf(command.page)}; break;
+        case Verb::Status:
+            args = {"status"};
+            break;
+        case Verb::Dial:
+            args = {"dial", command.number};
+            break;
+        case Verb::HangUp:
+            args = {"hangup"};
+            break;
+        case Verb::Answer:
+            args = {"answer"};
+            break;
+        case Verb::Events:
+            args = {"events"};
+            break;
+        case Verb::SmsList:
+            args = {"sms", "list", "--folder", PageNameOf(command.page)};
+            break;
         case Verb::SmsRead:
         case Verb::SmsDelete:
             args = {"sms", command.verb == Verb::SmsRead ? "read" : "delete",
@@ -862,12 +923,16 @@ std::vector<std::string> CommandArguments(const Command& command) {
 
 bool NeedsCard(const Command& command) {
     switch (command.verb) {
-        case Verb::CallLog: return false;
-        case Verb::ContactsList: return command.book != Book::Desktop;
+        case Verb::CallLog:
+            return false;
+        case Verb::ContactsList:
+            return command.book != Book::Desktop;
         case Verb::SmsList:
         case Verb::SmsRead:
-        case Verb::SmsDelete: return command.page == kPageInbox || command.page == kPageOutbox;
-        default: return true;
+        case Verb::SmsDelete:
+            return command.page == kPageInbox || command.page == kPageOutbox;
+        default:
+            return true;
     }
 }
 
@@ -884,8 +949,8 @@ int CheckInputs(const Command& command, std::string* error) {
         return kExitUsage;
     }
     if (static_cast<long long>(size) > kMaxVCardFileBytes) {
-        *error = command.file + " is too large for a phonebook (" + std::to_string(size) +
-                 " bytes).";
+        *error =
+            command.file + " is too large for a phonebook (" + std::to_string(size) + " bytes).";
         return kExitUsage;
     }
     if (access(command.file.c_str(), R_OK) != 0) {
@@ -943,8 +1008,10 @@ Result Run(Context& context, const Command& command) {
         log = ownLog.get();
     }
     switch (command.verb) {
-        case Verb::Status: return Status(context, command.json);
-        case Verb::Dial: return Dial(context, command, *log);
+        case Verb::Status:
+            return Status(context, command.json);
+        case Verb::Dial:
+            return Dial(context, command, *log);
         case Verb::HangUp:
             return Simple(HangUp(context.link) == 1, command.json, "Call ended",
                           "The card did not answer.");
@@ -952,15 +1019,24 @@ Result Run(Context& context, const Command& command) {
             const int code = AnswerCall(context.link);
             return Simple(code == 0, command.json, "Voice call", "No call to answer.");
         }
-        case Verb::SmsList: return SmsList(context, command);
-        case Verb::SmsRead: return SmsRead(context, command);
-        case Verb::SmsSend: return SmsSendAll(context, command);
-        case Verb::SmsDelete: return SmsDelete(context, command);
-        case Verb::ContactsList: return ContactsList(context, command);
-        case Verb::ContactsExport: return ContactsExport(context, command);
-        case Verb::ContactsImport: return ContactsImport(context, command);
-        case Verb::CallLog: return CallLogList(context, command, *log);
-        case Verb::Events: break;
+        case Verb::SmsList:
+            return SmsList(context, command);
+        case Verb::SmsRead:
+            return SmsRead(context, command);
+        case Verb::SmsSend:
+            return SmsSendAll(context, command);
+        case Verb::SmsDelete:
+            return SmsDelete(context, command);
+        case Verb::ContactsList:
+            return ContactsList(context, command);
+        case Verb::ContactsExport:
+            return ContactsExport(context, command);
+        case Verb::ContactsImport:
+            return ContactsImport(context, command);
+        case Verb::CallLog:
+            return CallLogList(context, command, *log);
+        case Verb::Events:
+            break;
     }
     return Fail(kExitUsage, "events runs only in vqm-phone itself.");
 }
@@ -1025,7 +1101,9 @@ int EventFeed::QueueLine(const char* line, int length) {
     return queued;
 }
 
-int EventFeed::DispatchAll(int* rings) { return next_ ? next_->DispatchAll(rings) : 0; }
+int EventFeed::DispatchAll(int* rings) {
+    return next_ ? next_->DispatchAll(rings) : 0;
+}
 
 std::vector<Event> EventFeed::Since(uint64_t since, uint64_t* last) {
     std::lock_guard<std::mutex> lock(mutex_);
@@ -1076,8 +1154,8 @@ bool DecodeReply(const std::string& line, Result* result, uint64_t* cursor) {
     if (fields.size() != 5 || fields[0] != kRequestTag || !AllDigits(fields[1])) return false;
     result->code = std::stoi(fields[1]);
     if (!Unescape(fields[2], &result->out) || !Unescape(fields[3], &result->err)) return false;
-    if (fields[4].empty() ||
-        !std::all_of(fields[4].begin(), fields[4].end(), [](char c) { return c >= '0' && c <= '9'; }))
+    if (fields[4].empty() || !std::all_of(fields[4].begin(), fields[4].end(),
+                                          [](char c) { return c >= '0' && c <= '9'; }))
         return false;
     if (cursor) *cursor = std::stoull(fields[4]);
     return true;

@@ -116,7 +116,7 @@ Result Run(Context& context, const Command& command);
 // One unsolicited event as a line of output.
 struct Event {
     uint64_t sequence = 0;
-    std::string kind;  // "ring", "caller", "message"
+    std::string kind;   // "ring", "caller", "message"
     std::string value;  // the caller's number, the message's SIM location
 };
 std::string FormatEvent(const Event& event, bool json);

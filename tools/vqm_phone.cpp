@@ -59,7 +59,9 @@ constexpr char kUsage[] =
 
 std::atomic<bool> stopRequested{false};
 
-void OnStop(int) { stopRequested = true; }
+void OnStop(int) {
+    stopRequested = true;
+}
 
 int Print(const Result& result) {
     std::fputs(result.out.c_str(), stdout);
@@ -193,17 +195,19 @@ int main(int argc, char** argv) {
     context.companionPath = vqm::WindowSocketPath(runtimeRoot, vqm::kCompanionClass);
     if (!NeedsCard(command)) return Print(Run(context, command));
     if (!vqm::CardPresent(settings, link.roots)) {
-        std::fputs("vqm-phone: no card: no active serial driver matches the PnpId setting "
-                   "(see vqm-dialer --list-ports).\n",
-                   stderr);
+        std::fputs(
+            "vqm-phone: no card: no active serial driver matches the PnpId setting "
+            "(see vqm-dialer --list-ports).\n",
+            stderr);
         return kExitNoCard;
     }
     EventFeed feed(link);
     if (command.verb == Verb::Events) link.events = &feed;
     if (!vqm::PortOpen(link)) {
-        std::fputs("vqm-phone: no card: its port cannot be opened, or the card does not "
-                   "answer.\n",
-                   stderr);
+        std::fputs(
+            "vqm-phone: no card: its port cannot be opened, or the card does not "
+            "answer.\n",
+            stderr);
         return kExitNoCard;
     }
     int code;

@@ -113,8 +113,8 @@ TEST_F(PhoneCommandsTest, TheDialersCopyOfACommandIsTheSameCommand) {
 }
 
 TEST_F(PhoneCommandsTest, RequestAndReplyLinesCarryAnyTextAndRefuseDamage) {
-    const std::vector<std::string> texts = {"", " ", "a b", "\\s", "line\nbreak\r\n", "\t:x:",
-                                            "Grüße 日本"};
+    const std::vector<std::string> texts = {"",      " ",         "a b", "\\s", "line\nbreak\r\n",
+                                            "\t:x:", "Grüße 日本"};
     for (const std::string& text : texts) {
         const std::string request = EncodeRequest({"x", text, ""});
         EXPECT_EQ(request.find_first_of("\n\r"), std::string::npos);
@@ -137,7 +137,7 @@ TEST_F(PhoneCommandsTest, RequestAndReplyLinesCarryAnyTextAndRefuseDamage) {
     for (const char* bad : {"", "1", "273 40001 0", "PHONE :a\\q", "PHONE a", "PHONEX :a"})
         EXPECT_FALSE(DecodeRequest(bad, &args)) << bad;
     for (const char* bad : {"0", "PHONE 0 :a :b", "PHONE x :a :b 0", "PHONE 0 a :b 0",
-                                   "PHONE 0 :a :b -1", "PHONE 0 :a\\ :b 0"})
+                            "PHONE 0 :a :b -1", "PHONE 0 :a\\ :b 0"})
         EXPECT_FALSE(DecodeReply(bad, &result)) << bad;
 }
 
@@ -151,7 +151,7 @@ TEST_F(PhoneCommandsTest, MessageTextsAreCheckedAsTheWriteViewCodesThem) {
         {"Hello", kExitDone, false},
         {std::string(160, 'a'), kExitDone, false},
         {std::string(161, 'a'), kExitUsage, false},
-        {"Grüße", kExitDone, false},  // ü and ß are in the GSM alphabet
+        {"Grüße", kExitDone, false},               // ü and ß are in the GSM alphabet
         {"price 5\xE2\x82\xAC", kExitDone, true},  // the euro sign needs UCS2 here
         {"\xE6\x97\xA5" + std::string(69, 'a'), kExitDone, true},  // 70 units
         {"\xE6\x97\xA5" + std::string(70, 'a'), kExitUsage, true},
