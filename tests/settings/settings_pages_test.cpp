@@ -4,6 +4,7 @@
 // answering or is pulled while an exchange waits.
 #include <gtest/gtest.h>
 
+#include <stdlib.h>
 #include <QApplication>
 #include <QCheckBox>
 #include <QComboBox>
@@ -84,6 +85,10 @@ class SettingsPagesTest : public ::testing::TestWithParam<Dialect> {
         });
         files_.registryRoot = temp_ / "registry";
         files_.wvdialPath = temp_ / "wvdialrc";
+        // A whole Settings view writes the modem command where the user's own files are:
+        // here, the test's folder.
+        setenv("XDG_CONFIG_HOME", (temp_ / "config").c_str(), 1);
+        setenv("VQM_WVDIAL_CONF", (temp_ / "view-wvdialrc").c_str(), 1);
         host_.resize(240, 294);
     }
     ~SettingsPagesTest() override {
@@ -166,6 +171,9 @@ TEST_P(SettingsPagesTest, ViewHasNinePagesInOrderAndFollowsTheCard) {
                                     "Call Barring", "Security", "Modem", "Call Waiting", "Tones"}));
     EXPECT_TRUE(tabs->usesScrollButtons());
     EXPECT_EQ(view.Page(kSettingsNetwork)->objectName(), "SETTINGS_NETWORK_PAGE");
+    // The Modem page wrote its command on creation, into the user's (here the test's) files.
+    EXPECT_EQ(ReadAll(temp_ / "view-wvdialrc"),
+              "[Dialer VQMFull]\nInit3 = AT+CBST=0,0,1;+CHSN=1,0,0,0\n");
     EXPECT_NE(dynamic_cast<ModemPage*>(view.Page(kSettingsModem)), nullptr);
     EXPECT_FALSE(view.isEnabled());
     state = 2;
@@ -179,6 +187,8 @@ TEST_P(SettingsPagesTest, ViewHasNinePagesInOrderAndFollowsTheCard) {
     // Commands from outside pick a page, a row and a button, as taps would.
     SaveCentre(settings_, 0, CentreEntry{});
     auto* centres = dynamic_cast<CentrePage*>(view.Page(kSettingsMessages));
+    // The connection had the page apply the SIM default; a tap meanwhile would be ignored.
+    ASSERT_TRUE(WaitFor([&] { return !centres->Busy(); }));
     centres->Load(false);
     for (int id :
          {kSettingsPageCommandFirst + kSettingsMessages, kSettingsRowCommandFirst, kCentreSelectId})
