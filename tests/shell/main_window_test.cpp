@@ -4,17 +4,20 @@
 
 #include <gtest/gtest.h>
 
+#include <QAbstractButton>
 #include <QAction>
 #include <QApplication>
 #include <QDialog>
 #include <QLabel>
 #include <filesystem>
+#include <tuple>
 
 #include "calls/dial_pad_view.h"
 #include "cardsim/card_sim.h"
 #include "link/link.h"
 #include "shell/dialogs.h"
 #include "shell/messages.h"
+#include "shell/notifier.h"
 #include "support/local_socket.h"
 #include "support/settings_store.h"
 #include "support/text.h"
@@ -222,12 +225,14 @@ TEST(MainWindowLook, ScreenshotsOfEachCardState) {
 }
 
 
-// Exit in the middle of a call, on both personalities of the card: every view, and the workers
-// it joins, goes while the window's message layer and card host are still there. (Under the
-// address sanitizer, a view waiting on a layer already gone is a use after free.)
-class MainWindowExitTest : public ::testing::TestWithParam<cardsim::Dialect> {};
+// Exit during a call and after one, on both personalities of the card: every view, and the
+// workers it joins, goes while the window's message layer and card host are still there. (Under
+// the address sanitizer, a view waiting on a layer already gone is a use after free.)
+enum class ExitMoment { DuringTheCall, AfterTheCall };
+class MainWindowExitTest
+    : public ::testing::TestWithParam<std::tuple<cardsim::Dialect, ExitMoment>> {};
 
-TEST_P(MainWindowExitTest, ExitDuringACallTakesTheViewsDownFirst) {
+TEST_P(MainWindowExitTest, TheViewsGoFirst) {
     const testing::TempFolder temp;
     SettingsStore settings(temp / "settings.db");
     SetSettingString(settings, u"InstallPath", Utf8ToUtf16(temp / "install").c_str());
@@ -238,7 +243,7 @@ TEST_P(MainWindowExitTest, ExitDuringACallTakesTheViewsDownFirst) {
     ShellContext context{settings, link, dialogs, temp / "run"};
     cardsim::SimConfig config;
     config.baud = 0;
-    config.engine.dialect = GetParam();
+    config.engine.dialect = std::get<0>(GetParam());
     config.engine.dialDelayMs = 200;
     config.engine.ringTimeoutMs = 600000;
     cardsim::CardSim sim(config);
@@ -260,30 +265,52 @@ TEST_P(MainWindowExitTest, ExitDuringACallTakesTheViewsDownFirst) {
         testing::PumpingFor(
             pump, [&] { return sim.Control("status").find("call=none") == std::string::npos; }),
         std::chrono::seconds(10)));
+    if (std::get<1>(GetParam()) == ExitMoment::AfterTheCall) {
+        auto waitState = [&](auto holds) {
+            return testing::WaitFor(
+                testing::PumpingFor(pump, [&] { return holds(pad->Pad().CallState()); }),
+                std::chrono::seconds(10));
+        };
+        // The number is reachable: the far end answers by itself.
+        ASSERT_TRUE(waitState([](int state) { return state == kCallVoice; }))
+            << "state " << pad->Pad().CallState() << ", " << sim.Control("status");
+        // End, as a person ends it: the call is over and its result shows.
+        auto* end = qobject_cast<QAbstractButton*>(FindControl(pad, kKeyEndId));
+        ASSERT_NE(end, nullptr);
+        end->click();
+        ASSERT_TRUE(waitState([](int state) { return state == kCallEnded || state == kCallIdle; }));
+    }
 
-    int viewsGone = 0, goneWithTheLayer = 0;
+    // The window's own parts go after the views: its members first of all, and then the
+    // children made before the views (the notifier among them).
+    int viewsGone = 0, goneFirst = 0;
+    bool partsGone = false;
+    QObject::connect(&window->Notifications(), &QObject::destroyed, [&] { partsGone = true; });
     MessageLayer* const layer = &window->Messages();
     for (int i = 0; i < kViewCount; ++i)
         if (View* view = window->ViewAt(i))
             QObject::connect(view, &QObject::destroyed, [&] {
                 ++viewsGone;
-                if (context.messages == layer && context.mainWindow)
-                    ++goneWithTheLayer;
+                if (!partsGone && context.messages == layer && context.mainWindow) ++goneFirst;
             });
     window->Command(kCmdExit);  // hangs up, closes the link
     window.reset();
     EXPECT_EQ(viewsGone, kViewCount);
-    EXPECT_EQ(goneWithTheLayer, kViewCount);
+    EXPECT_EQ(goneFirst, kViewCount);
     EXPECT_EQ(context.messages, nullptr);
     EXPECT_EQ(context.mainWindow, nullptr);
     PortClose(link);
 }
 
-INSTANTIATE_TEST_SUITE_P(Dialects, MainWindowExitTest,
-                         ::testing::Values(cardsim::Dialect::Card, cardsim::Dialect::Standard),
-                         [](const ::testing::TestParamInfo<cardsim::Dialect>& info) {
-                             return info.param == cardsim::Dialect::Card ? "card" : "standard";
-                         });
+INSTANTIATE_TEST_SUITE_P(
+    DialectsAndMoments, MainWindowExitTest,
+    ::testing::Combine(::testing::Values(cardsim::Dialect::Card, cardsim::Dialect::Standard),
+                       ::testing::Values(ExitMoment::DuringTheCall, ExitMoment::AfterTheCall)),
+    [](const auto& info) {
+        return std::string(std::get<0>(info.param) == cardsim::Dialect::Card ? "card"
+                                                                             : "standard") +
+               (std::get<1>(info.param) == ExitMoment::DuringTheCall ? "_during" : "_after");
+    });
 
 }  // namespace
 }  // namespace vqm
