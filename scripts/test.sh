@@ -19,6 +19,10 @@ cmake --build "$build" --parallel "$(nproc)"
 if [ "$sanitize" = thread ]; then
     export TSAN_OPTIONS="suppressions=$top/scripts/tsan.supp ${TSAN_OPTIONS:-}"
 fi
+# The Modem page writes the data-call command wherever a window is built: the tests keep it out
+# of the user's own configuration.
+export XDG_CONFIG_HOME="$build/test-home/config" VQM_WVDIAL_CONF="$build/test-home/wvdialrc"
+mkdir -p "$XDG_CONFIG_HOME"
 # Most tests wait on the simulated card's line (a reply ends after 200 ms of silence), so twice
 # as many run at once as there are cores.
 ctest --test-dir "$build" --output-on-failure --parallel "$(( $(nproc) * 2 ))"
