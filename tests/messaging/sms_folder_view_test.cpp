@@ -28,6 +28,7 @@
 #include "support/text.h"
 #include "tests/common/sim_card_host.h"
 #include "tests/common/temp_folder.h"
+#include "tests/common/wait.h"
 
 namespace vqm {
 namespace {
@@ -79,12 +80,7 @@ class SmsFolderViewTest : public ::testing::Test {
     }
 
     bool WaitFor(const std::function<bool()>& done, int limitMs = 20000) {
-        const auto until = std::chrono::steady_clock::now() + milliseconds(limitMs);
-        while (!done() && std::chrono::steady_clock::now() < until) {
-            QApplication::processEvents(QEventLoop::AllEvents, 20);
-            std::this_thread::sleep_for(milliseconds(5));
-        }
-        return done();
+        return testing::WaitPumping(done, milliseconds(limitMs));
     }
     QTreeWidget* List(int page) { return folder_->List(page); }
     std::vector<std::string> Column(int page, int column) {
