@@ -25,6 +25,7 @@
 #include "support/text.h"
 #include "tests/common/sim_card_host.h"
 #include "tests/common/temp_folder.h"
+#include "tests/common/wait.h"
 
 namespace vqm {
 namespace {
@@ -80,12 +81,7 @@ class CallWaitingWindowTest : public ::testing::TestWithParam<cardsim::Dialect> 
     }
 
     bool WaitFor(const std::function<bool()>& done, int limitMs = 20000) {
-        const auto until = std::chrono::steady_clock::now() + milliseconds(limitMs);
-        while (!done() && std::chrono::steady_clock::now() < until) {
-            QApplication::processEvents(QEventLoop::AllEvents, 20);
-            std::this_thread::sleep_for(milliseconds(5));
-        }
-        return done();
+        return testing::WaitPumping(done, milliseconds(limitMs));
     }
     // Presses a button of the page and waits for its exchange to end.
     void Press(int id) {
