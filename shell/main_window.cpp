@@ -331,8 +331,13 @@ void MainWindow::ShowAbout() {
     about.setObjectName("ABOUT_DIALOG");
     about.setWindowTitle("About");
     auto* layout = new QVBoxLayout(&about);
-    char16_t firmwareText[64];
-    const float version = GetFirmwareVersion(context_.link, firmwareText, 64);
+    char16_t firmwareText[64] = {};
+    float version = 0.0f;
+    // A query of the card: run aside, so the window keeps painting while the card answers.
+    RunAside([&] {
+        version = GetFirmwareVersion(context_.link, firmwareText, 64);
+        return 1;
+    });
     auto* firmware = new QLabel(&about);
     SetControlId(firmware, kAboutFirmwareId);
     if (version != 0.0f) {
