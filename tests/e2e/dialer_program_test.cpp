@@ -2,19 +2,17 @@
 // with its own sockets in a private runtime folder. What the dialer shows is read from its
 // --ui-log record; its boxes are answered by --answer-boxes.
 #include <gtest/gtest.h>
-#include <sys/stat.h>
 
 #include <chrono>
+#include <cstring>
 #include <filesystem>
 #include <fstream>
-#include <sstream>
 #include <string>
 #include <thread>
 #include <vector>
 
 #include "support/local_socket.h"
-#include "support/settings_store.h"
-#include "tests/common/process.h"
+#include "tests/common/program_host.h"
 #include "tests/common/temp_folder.h"
 
 namespace vqm {
@@ -30,59 +28,17 @@ constexpr char kPowerUpQuestion[] =
     "box VQM Dialer: Tavro Card Phone 2.0 is not powered up, would you like to power it up now?";
 
 // Every test runs on the card's own dialect and on a standard 27.007 modem.
-class DialerProgramTest : public ::testing::TestWithParam<const char*> {
+class DialerProgramTest : public ::testing::TestWithParam<const char*>,
+                          protected testing::ProgramHost {
   protected:
-    DialerProgramTest() {
-        fs::create_directories(run_);
-        chmod(run_.c_str(), 0700);
-        SettingsStore settings(temp_ / "settings.db");
-        SetSettingString(settings, u"PnpId", u"TAVRO_CARD_PHONE");
-    }
-
-    // The variables a user's session gives both programs, pointed into the test's folder.
-    std::string Environment() const {
-        return "env XDG_RUNTIME_DIR=" + temp_.Path() +
-               "/xdg VQM_SETTINGS_DB=" + (temp_ / "settings.db") +
-               " XDG_DATA_HOME=" + (temp_ / "data") +
-               " QT_QPA_PLATFORM=offscreen DBUS_SESSION_BUS_ADDRESS=unix:path=/nonexistent ";
-    }
+    // The card unpowered unless options say otherwise, taking half a second to power up.
     void StartCard(const std::string& options = "") {
-        card_.Start(Environment() + VQM_CARDSIM + " --dialect " + GetParam() +
-                    " --power-up-ms 500 --state-dir " + (temp_ / "state") + " " + options + " >" +
-                    (temp_ / "cardsim.out") + " 2>&1");
-        ASSERT_TRUE(
-            WaitFor([&] { return ServerAnswers(WindowSocketPath(run_, kCompanionClass)); }));
-    }
-    void StartDialer(const std::string& answer) {
-        dialer_.Start(Environment() + VQM_DIALER + " --ui-log " + (temp_ / "ui.log") +
-                      " --answer-boxes " + answer + " >" + (temp_ / "dialer.out") + " 2>&1");
-        ASSERT_TRUE(WaitFor([&] { return ServerAnswers(DialerSocket()); }, 10s))
-            << Read(temp_ / "dialer.out");
-    }
-    std::string DialerSocket() const { return WindowSocketPath(run_, "DIALERAPP_CLASS"); }
-    static std::string Read(const std::string& path) {
-        std::ifstream file(path);
-        std::ostringstream text;
-        text << file.rdbuf();
-        return text.str();
-    }
-    std::string Log() const { return Read(temp_ / "ui.log"); }
-    bool LogShows(const std::string& text, std::chrono::milliseconds limit = 20s) {
-        return WaitFor([&] { return Log().find(text) != std::string::npos; }, limit);
-    }
-    size_t Count(const std::string& text) const {
-        const std::string log = Log();
-        size_t count = 0;
-        for (size_t at = log.find(text); at != std::string::npos; at = log.find(text, at + 1))
-            ++count;
-        return count;
-    }
-    std::pair<std::string, int> Ctl(const std::string& command) {
-        return RunShell(Environment() + VQM_CARDSIM + " ctl " + command);
+        ProgramHost::StartCard(std::string("--dialect ") + GetParam() + " --power-up-ms 500 " +
+                               options);
     }
     bool Standard() const { return std::string(GetParam()) == "standard"; }
     // A key of the DialPad, as a click on it.
-    void Key(int id) { SendWindowMessage(DialerSocket(), 273, id, 0, 2000); }
+    void Key(int id) { Command(id); }
     void Type(const std::string& digits) {
         for (char c : digits)
             Key(1126 + (c - '0'));
@@ -97,23 +53,18 @@ class DialerProgramTest : public ::testing::TestWithParam<const char*> {
             numbers.emplace_back(record, strnlen(record, 32));
         return numbers;
     }
-
-    const testing::TempFolder temp_;
-    const std::string run_ = temp_ / "xdg/VQMFull";
-    Background card_;
-    Background dialer_;
 };
 
 TEST_P(DialerProgramTest, PowerUpAnsweredOkConnectsAndTheDialerEndsCleanly) {
-    StartCard();
-    StartDialer("ok");
+    ASSERT_NO_FATAL_FAILURE(StartCard());
+    ASSERT_NO_FATAL_FAILURE(StartDialer("--answer-boxes ok"));
     ASSERT_TRUE(LogShows(std::string(kPowerUpQuestion) + " -> OK")) << Log();
     ASSERT_TRUE(LogShows("status Initializing...")) << Log();
     ASSERT_TRUE(LogShows("card 2 connected")) << Log();
     EXPECT_LT(Log().find("window shown"), Log().find("card 2 connected"));
 
     // About reads the firmware from the card (a modem that is not the card has no version).
-    EXPECT_EQ(SendWindowMessage(DialerSocket(), 273, 40018, 0), 0L);
+    EXPECT_EQ(Command(40018, 10000), 0L);
     if (!Standard())
         EXPECT_TRUE(LogShows("dialog About: Tavro Card Phone 2.0 Firmware Version 4.00")) << Log();
     else
@@ -126,15 +77,15 @@ TEST_P(DialerProgramTest, PowerUpAnsweredOkConnectsAndTheDialerEndsCleanly) {
 
     // Exit from the File menu: the dialer ends by itself, leaving nothing running and
     // nothing answering for it.
-    SendWindowMessage(DialerSocket(), 273, 40016, 0, 2000);
+    Command(kExit);
     EXPECT_EQ(dialer_.WaitExit(10s), 0) << Read(temp_ / "dialer.out");
     EXPECT_FALSE(ServerAnswers(DialerSocket()));
     EXPECT_EQ(Ctl("status").first.find("call=none") != std::string::npos, true);
 }
 
 TEST_P(DialerProgramTest, PullingTheCardDropsTheConnectionAndAStopSignalEndsTheDialer) {
-    StartCard("--powered");
-    StartDialer("ok");
+    ASSERT_NO_FATAL_FAILURE(StartCard("--powered"));
+    ASSERT_NO_FATAL_FAILURE(StartDialer("--answer-boxes ok"));
     ASSERT_TRUE(LogShows("card 2 connected")) << Log();
     EXPECT_EQ(Count("box "), 0u);  // a powered card is not asked about
 
@@ -148,8 +99,8 @@ TEST_P(DialerProgramTest, PullingTheCardDropsTheConnectionAndAStopSignalEndsTheD
 }
 
 TEST_P(DialerProgramTest, DecliningThePowerUpAsksOnceAndSaysTheCardIsAbsentOnce) {
-    StartCard();
-    StartDialer("cancel");
+    ASSERT_NO_FATAL_FAILURE(StartCard());
+    ASSERT_NO_FATAL_FAILURE(StartDialer("--answer-boxes cancel"));
     ASSERT_TRUE(LogShows(std::string(kPowerUpQuestion) + " -> Cancel")) << Log();
     ASSERT_TRUE(LogShows("status No Card Phone inserted.")) << Log();
     // Three more passes of the once-a-second watch change nothing.
@@ -162,8 +113,8 @@ TEST_P(DialerProgramTest, DecliningThePowerUpAsksOnceAndSaysTheCardIsAbsentOnce)
 // Rings, caller ids, answers, rejects, hang-ups on both sides, a dial and a busy number, all
 // through the real program; the log of what the window showed tells what happened.
 TEST_P(DialerProgramTest, CallsComeAndGoAndAreLogged) {
-    StartCard("--powered");
-    StartDialer("ok");
+    ASSERT_NO_FATAL_FAILURE(StartCard("--powered"));
+    ASSERT_NO_FATAL_FAILURE(StartDialer("--answer-boxes ok"));
     ASSERT_TRUE(LogShows("card 2 connected")) << Log();
     // The operator, in whatever form the modem reports it.
     EXPECT_TRUE(LogShows("status COSMOTE")) << Log();
@@ -225,8 +176,8 @@ TEST_P(DialerProgramTest, CallsComeAndGoAndAreLogged) {
 // A card that stops answering holds up neither the window nor the exit, and is taken for gone
 // once it stays silent.
 TEST_P(DialerProgramTest, ASilentCardIsTakenForGoneAndTheDialerStillExitsAtOnce) {
-    StartCard("--powered");
-    StartDialer("ok");
+    ASSERT_NO_FATAL_FAILURE(StartCard("--powered"));
+    ASSERT_NO_FATAL_FAILURE(StartDialer("--answer-boxes ok"));
     ASSERT_TRUE(LogShows("card 2 connected")) << Log();
     EXPECT_EQ(Ctl("silent on").second, 0);
     // Three call-list polls without an answer.
@@ -242,7 +193,7 @@ TEST_P(DialerProgramTest, ASilentCardIsTakenForGoneAndTheDialerStillExitsAtOnce)
     Key(1138);
     ASSERT_TRUE(LogShows("status Dialing...")) << Log();
     const auto start = std::chrono::steady_clock::now();
-    SendWindowMessage(DialerSocket(), 273, 40016, 0, 2000);
+    Command(kExit);
     EXPECT_EQ(dialer_.WaitExit(10s), 0) << Read(temp_ / "dialer.out");
     // The message folder's SIM commands still run on the window's thread, each bounded.
     EXPECT_LT(std::chrono::steady_clock::now() - start, 5s);

@@ -3,94 +3,51 @@
 // --dialog-fields file, and the results read from the dialer's --ui-log record and from the
 // card's own record of its state.
 #include <gtest/gtest.h>
-#include <sys/stat.h>
 
 #include <chrono>
 #include <filesystem>
 #include <fstream>
 #include <functional>
-#include <sstream>
 #include <string>
 
-#include "support/local_socket.h"
-#include "support/settings_store.h"
-#include "tests/common/process.h"
-#include "tests/common/temp_folder.h"
+#include "tests/common/program_host.h"
 
 namespace vqm {
 namespace {
 
 namespace fs = std::filesystem;
 using namespace std::chrono_literals;
-using testing::Background;
-using testing::RunShell;
 using testing::WaitFor;
 
-constexpr int kShowSettings = 40005, kExit = 40016;
+constexpr int kShowSettings = 40005;
 constexpr int kPageForward = 1113, kPageBarring = 1114, kPageSecurity = 1115;
 constexpr int kBusyRowButton = 1073, kForwardRequest = 1076;
 constexpr int kBarInternational = 1090, kBarAllOutgoing = 1092;
 constexpr int kPinRequestOn = 1082, kPinRequestOff = 1083, kRequestStatus = 1084,
               kChangeCode = 1085;
 
-class NetworkServicesProgramTest : public ::testing::TestWithParam<const char*> {
+class NetworkServicesProgramTest : public ::testing::TestWithParam<const char*>,
+                                   protected testing::ProgramHost {
   protected:
-    NetworkServicesProgramTest() {
-        fs::create_directories(run_);
-        chmod(run_.c_str(), 0700);
-        SettingsStore settings(temp_ / "settings.db");
-        SetSettingString(settings, u"PnpId", u"TAVRO_CARD_PHONE");
-    }
-    ~NetworkServicesProgramTest() override {
-        if (ServerAnswers(DialerSocket())) SendWindowMessage(DialerSocket(), 273, kExit, 0, 2000);
-        dialer_.WaitExit(10s);
-    }
+    NetworkServicesProgramTest() : ProgramHost(/*ownConfig=*/true) {}
+    ~NetworkServicesProgramTest() override { ExitDialer(); }
 
-    std::string Environment() const {
-        return "env XDG_RUNTIME_DIR=" + temp_.Path() +
-               "/xdg VQM_SETTINGS_DB=" + (temp_ / "settings.db") +
-               " XDG_DATA_HOME=" + (temp_ / "data") + " XDG_CONFIG_HOME=" + (temp_ / "config") +
-               " QT_QPA_PLATFORM=offscreen DBUS_SESSION_BUS_ADDRESS=unix:path=/nonexistent ";
-    }
     void Start() {
-        card_.Start(Environment() + VQM_CARDSIM + " --dialect " + GetParam() +
-                    " --powered --state-dir " + (temp_ / "state") + " >" + (temp_ / "cardsim.out") +
-                    " 2>&1");
-        ASSERT_TRUE(
-            WaitFor([&] { return ServerAnswers(WindowSocketPath(run_, kCompanionClass)); }));
-        dialer_.Start(Environment() + VQM_DIALER + " --ui-log " + (temp_ / "ui.log") +
-                      " --answer-boxes ok --dialog-fields " + Fields() + " >" +
-                      (temp_ / "dialer.out") + " 2>&1");
-        ASSERT_TRUE(WaitFor([&] { return ServerAnswers(DialerSocket()); }, 10s));
+        ASSERT_NO_FATAL_FAILURE(StartCard(std::string("--dialect ") + GetParam() + " --powered"));
+        ASSERT_NO_FATAL_FAILURE(StartDialer("--answer-boxes ok --dialog-fields " + Fields()));
         // The Network page reads the operator once the card's state has reached every page, so
         // the Settings view is usable from then on.
         ASSERT_TRUE(Shows("settings-network operator")) << Log();
         Tap(kShowSettings);
     }
-    std::string DialerSocket() const { return WindowSocketPath(run_, "DIALERAPP_CLASS"); }
     std::string Fields() const { return temp_ / "fields"; }
-    static std::string Read(const std::string& path) {
-        std::ifstream file(path, std::ios::binary);
-        std::ostringstream text;
-        text << file.rdbuf();
-        return text.str();
-    }
-    std::string Log() const { return Read(temp_ / "ui.log"); }
-    static int Count(const std::string& text, const std::string& what) {
-        int n = 0;
-        for (size_t at = text.find(what); at != std::string::npos; at = text.find(what, at + 1))
-            ++n;
-        return n;
-    }
     // The log shows text at least times times.
-    bool Shows(const std::string& text, int times = 1) {
-        return WaitFor([&] { return Count(Log(), text) >= times; }, 20s);
-    }
+    bool Shows(const std::string& text, size_t times = 1) { return LogShows(text, 20s, times); }
     bool CardKeeps(const std::string& line) {
         return WaitFor(
             [&] { return Read(temp_ / "state/card.state").find(line) != std::string::npos; }, 20s);
     }
-    void Tap(int id) { SendWindowMessage(DialerSocket(), 273, id, 0, 2000); }
+    void Tap(int id) { Command(id); }
     // Taps until shown() holds. The window is greyed while a page waits for the card (as a
     // person would find it), so a tap that comes then is not taken and is made again.
     bool TapUntil(int id, const std::function<bool()>& shown) {
@@ -105,32 +62,27 @@ class NetworkServicesProgramTest : public ::testing::TestWithParam<const char*> 
         std::ofstream(Fields()) << fields << "\n";
         return TapUntil(id, [&] { return !fs::exists(Fields()); });
     }
-
-    const testing::TempFolder temp_;
-    const std::string run_ = temp_ / "xdg/VQMFull";
-    Background card_;
-    Background dialer_;
 };
 
 INSTANTIATE_TEST_SUITE_P(Dialects, NetworkServicesProgramTest,
                          ::testing::Values("card", "standard"));
 
 TEST_P(NetworkServicesProgramTest, BusyVoiceCallsForwardedAndRequestShowsIt) {
-    Start();
+    ASSERT_NO_FATAL_FAILURE(Start());
     Tap(kPageForward);
     ASSERT_TRUE(TapWithDialog(kBusyRowButton, "FORWARD_REQUEST_DIALOG 1153 1149=+441234567890"))
         << Log();
     EXPECT_TRUE(CardKeeps("net-forward 1 1 +441234567890 145 20 1\n"))
         << Read(temp_ / "state/card.state");
     ASSERT_TRUE(TapUntil(kForwardRequest, [&] {
-        return Count(Log(), "settings-forward Voice All Calls:") > 0;
+        return Count("settings-forward Voice All Calls:") > 0;
     })) << Log();
     EXPECT_TRUE(Shows("settings-forward Voice If Busy: +441234567890")) << Log();
     EXPECT_TRUE(Shows("settings-forward Voice All Calls: NOT ACTIVE")) << Log();
 }
 
 TEST_P(NetworkServicesProgramTest, InternationalCallsBarredWithTheRightPasswordOnly) {
-    Start();
+    ASSERT_NO_FATAL_FAILURE(Start());
     Tap(kPageBarring);
     ASSERT_TRUE(TapWithDialog(kBarInternational, "ENTER_ACCESS_CODE_DIALOG 1171=0000"));
     EXPECT_TRUE(CardKeeps("net-barring OI 1\n")) << Read(temp_ / "state/card.state");
@@ -144,7 +96,7 @@ TEST_P(NetworkServicesProgramTest, InternationalCallsBarredWithTheRightPasswordO
 }
 
 TEST_P(NetworkServicesProgramTest, PinRequestOnPinChangedThenThreeWrongPinsBlockTheSim) {
-    Start();
+    ASSERT_NO_FATAL_FAILURE(Start());
     Tap(kPageSecurity);
     ASSERT_TRUE(TapWithDialog(kPinRequestOn, "PIN_CODE_REQUEST_DIALOG 1172=1234"));
     ASSERT_TRUE(Shows("settings-security pin-request on")) << Log();
@@ -157,10 +109,10 @@ TEST_P(NetworkServicesProgramTest, PinRequestOnPinChangedThenThreeWrongPinsBlock
         ASSERT_TRUE(TapWithDialog(kPinRequestOff, "PIN_CODE_REQUEST_DIALOG 1172=0000"));
         ASSERT_TRUE(Shows(failed, attempt)) << Log();
     }
-    EXPECT_EQ(Count(Log(), failed + "incorrect password"), 2) << Log();
-    EXPECT_EQ(Count(Log(), failed + "SIM PUK required"), 1) << Log();
+    EXPECT_EQ(Count(failed + "incorrect password"), 2u) << Log();
+    EXPECT_EQ(Count(failed + "SIM PUK required"), 1u) << Log();
     ASSERT_TRUE(TapUntil(kRequestStatus, [&] {
-        return Count(Log(), "box VQM Dialer: Request error / SIM PUK required -> OK") > 0;
+        return Count("box VQM Dialer: Request error / SIM PUK required -> OK") > 0;
     })) << Log();
     EXPECT_TRUE(Shows("settings-security pin-request unknown")) << Log();
     EXPECT_TRUE(CardKeeps("net-tries 0 3\n"));
