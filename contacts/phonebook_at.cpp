@@ -17,8 +17,13 @@ constexpr char kStorageNames[kPhonebookStorageCount][3] = {"DC", "EN", "FD", "MC
 constexpr size_t kCommandSize = 32;
 constexpr size_t kWriteCommandSize = 256;
 
+// The SIM answers from its own memory, not the network's: a card silent for this long is not
+// going to answer, and must not hold the port for ever.
+constexpr int kPhonebookAnswerLimitMs = 10000;
+
 int Exchange(Link& link, const char* command, char* reply, size_t replySize) {
-    return static_cast<int>(AtCommand(link, command, reply, replySize));
+    return static_cast<int>(
+        AtCommandWithin(link, command, reply, replySize, kPhonebookAnswerLimitMs));
 }
 
 // Write and delete select their storage first; what the select answers does not stop them.

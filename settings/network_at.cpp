@@ -40,7 +40,9 @@ int ParseNetworkMode(const char* reply, int length) {
 
 int NetworkMode(Link& link) {
     char reply[256];
-    const int length = static_cast<int>(AtCommand(link, "AT+COPS?\r", reply, sizeof reply));
+    // A query the card answers at once: a silent card must not hold the port for ever.
+    const int length = static_cast<int>(
+        AtCommandWithin(link, "AT+COPS?\r", reply, sizeof reply, kQueryAnswerLimitMs));
     return length == 0 ? -1 : ParseNetworkMode(reply, length);
 }
 
