@@ -143,27 +143,27 @@ void BarringPage::BuildSubPage(View* page, int index) {
         auto* label = new QLabel(group == 0 ? "Outgoing Calls:" : "Incoming Calls:", page);
         label->setGeometry(kMargin, top, width - 2 * kMargin, kLabelHeight);
         top += kLabelHeight + 2;
-        for (const BarButton& spec : kButtons) {
-            const bool outgoing = spec.id <= kLiftOutgoingId;
+        for (const BarButton& entry : kButtons) {
+            const bool outgoing = entry.id <= kLiftOutgoingId;
             if (outgoing != (group == 0)) continue;
-            const int left = kMargin + spec.column * column;
-            const int y = top + spec.row * kStep;
-            const bool lifts = spec.facility >= kAllBarrings;
-            auto* button = new QPushButton(spec.caption, page);
-            SetControlId(button, spec.id);
+            const int left = kMargin + entry.column * column;
+            const int y = top + entry.row * kStep;
+            const bool lifts = entry.facility >= kAllBarrings;
+            auto* button = new QPushButton(entry.caption, page);
+            SetControlId(button, entry.id);
             if (lifts) {
                 button->setGeometry(left, y, column - 2, kButtonHeight);
                 QObject::connect(button, &QPushButton::clicked, this,
-                                 [this, index, id = spec.id] { Lift(index, id); });
+                                 [this, index, id = entry.id] { Lift(index, id); });
             } else {
                 // The facility's state stands in front of its button.
                 auto* mark = new QLabel(page);
-                SetControlId(mark, spec.id + kBarringMarkOffset);
+                SetControlId(mark, entry.id + kBarringMarkOffset);
                 mark->setAlignment(Qt::AlignCenter);
                 mark->setGeometry(left, y, kMarkWidth, kButtonHeight);
                 button->setGeometry(left + kMarkWidth, y, column - kMarkWidth - 2, kButtonHeight);
                 QObject::connect(button, &QPushButton::clicked, this,
-                                 [this, index, id = spec.id] { Bar(index, id); });
+                                 [this, index, id = entry.id] { Bar(index, id); });
             }
         }
         top += 2 * kStep + 4;

@@ -166,11 +166,11 @@ TEST_F(SmsAtTest, SendUsesTheCentreAndItsParameter) {
     EXPECT_EQ(std::u16string(centre), u"+441234");
     EXPECT_EQ(validity, 167);
 
-    // Without a centre the card cannot send.
+    // An empty number gives the card back the centre its SIM holds ("Use SIM Default").
     ASSERT_EQ(SmsSetCentre(link_, u"", 17), 1);
     ASSERT_EQ(SmsGetCentre(link_, centre, 40, &validity), 1);
-    EXPECT_EQ(std::u16string(centre), u"");
-    EXPECT_EQ(SmsSend(link_, kSmsModePdu, &message), 0);
+    EXPECT_EQ(std::u16string(centre), u"+3097100000");
+    EXPECT_EQ(SmsSend(link_, kSmsModePdu, &message), 1);
     EXPECT_EQ(SmsSetCentre(link_, u"12ab", 17), 0);
 }
 
