@@ -113,6 +113,12 @@ void CardEngine::Feed(const char* bytes, size_t length, Clock::time_point now) {
             continue;
         }
         if (echo_ && !Standard()) output_.push_back(c);
+        if (c == '\r' && !holdAt_.empty() && input_.find(holdAt_) != std::string::npos) {
+            input_.clear();
+            holdAt_.clear();
+            held_ = silent_ = true;
+            continue;
+        }
         if (c == '\r') {
             std::string line;
             line.swap(input_);
@@ -527,6 +533,9 @@ void CardEngine::PowerLost() {
     unsolicitedEnd_ = 0;
     partlyTaken_ = false;
     injection_.armed = false;
+    // A card that hung comes back from a power cut answering, and waits for no command.
+    holdAt_.clear();
+    if (held_) silent_ = held_ = false;
     // A modem that comes back from a power cut has its start-up settings again.
     if (Standard()) {
         cellularRing_ = callerId_ = false;

@@ -112,7 +112,15 @@ class CardEngine {
         unanswered_.erase(number);
         ++revision_;
     }
-    void SetSilent(bool silent) { silent_ = silent; }
+    void SetSilent(bool silent) {
+        silent_ = silent;
+        held_ = false;
+    }
+    // The card takes the next command line that contains text and then falls silent, as a
+    // card whose firmware hangs in the middle of that command: a test can pull it at a known
+    // moment of an exchange. Silence ends with SetSilent(false) or a loss of power.
+    void HoldAt(const std::string& text) { holdAt_ = text; }
+    bool Held() const { return held_; }
     void SendGarbage(size_t count);
     // The network side's signal and registration; a standard modem reports each change with an
     // unsolicited line ("^RSSI: <n>", "+CREG: 1") that the dialer has to ignore.
@@ -164,6 +172,8 @@ class CardEngine {
     std::string pendingUnsolicited_;
     bool echo_ = true;
     bool silent_ = false;
+    std::string holdAt_;           // the command that makes the card fall silent; empty none
+    bool held_ = false;            // silent since that command came
     bool commandRunning_ = false;  // a deferred ATD is waiting for the network
     bool discardLine_ = false;     // the rest of a line that aborted a dial
     bool unknownCommand_ = false;  // the last failed command was nobody's

@@ -172,6 +172,11 @@ std::string CardSim::Control(const std::string& line) {
         std::string result;
         const std::string rest = AfterFirstWord(line);
         if (command == "unsolicited" || command == "inject") return ControlLine(command, rest);
+        if (command == "hold") {
+            if (rest.empty()) return "ERROR: hold needs a command's text, e.g. +CMGS=";
+            engine_.HoldAt(rest);
+            return "OK";
+        }
         for (const auto& set : engine_.CommandSets()) {
             result = set->Control(command, rest);
             if (!result.empty()) break;
@@ -266,6 +271,7 @@ std::string CardSim::Status() const {
         << " firmware=" << config.firmware << " volume=" << engine_.Core().Volume()
         << " device=" << (slavePath_.empty() ? "-" : slavePath_)
         << " dialect=" << (engine_.Standard() ? "standard" : "card");
+    if (engine_.Held()) out << " held=1";
     return out.str();
 }
 

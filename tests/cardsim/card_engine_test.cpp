@@ -145,6 +145,35 @@ TEST_F(EngineTest, SilenceAndGarbage) {
     EXPECT_EQ(Send("AT\r"), "AT\r\r\nOK\r\n");
 }
 
+// A hold lets other commands through, then swallows the one it names and everything after,
+// rings included, until the silence is lifted or the power goes.
+TEST_F(EngineTest, AHoldFallsSilentAtTheNamedCommandUntilLiftedOrPowerIsLost) {
+    Send("ATE0\r");
+    engine_.HoldAt("+CSQ");
+    EXPECT_EQ(Send("AT+CLVL=8\r"), "\r\nOK\r\n");
+    EXPECT_FALSE(engine_.Held());
+    EXPECT_EQ(Send("AT+CSQ\r"), "");
+    EXPECT_TRUE(engine_.Held());
+    EXPECT_EQ(Send("AT\r"), "");
+    engine_.Ring("0123", now_);
+    EXPECT_EQ(engine_.TakeOutput(), "");
+    engine_.SetSilent(false);
+    EXPECT_FALSE(engine_.Held());
+    engine_.CallerHangUp();
+    EXPECT_EQ(Send("AT+CSQ\r"), "\r\n+CSQ: 20,0\r\n\r\nOK\r\n");  // the hold was used up
+
+    engine_.HoldAt("+CSQ");
+    Send("AT+CSQ\r");
+    ASSERT_TRUE(engine_.Held());
+    engine_.PowerLost();
+    EXPECT_FALSE(engine_.Held());
+    EXPECT_EQ(Send("AT\r"), "\r\nOK\r\n");
+    // A hold still waiting goes with the power too.
+    engine_.HoldAt("+CSQ");
+    engine_.PowerLost();
+    EXPECT_EQ(Send("AT+CSQ\r"), "\r\n+CSQ: 20,0\r\n\r\nOK\r\n");
+}
+
 }  // namespace
 }  // namespace vqm::cardsim
 
