@@ -83,7 +83,7 @@ TEST_F(CentresTest, MissingWrongTypeAndOutOfRangeReadAsDefaults) {
     EXPECT_EQ(list.entries[1].validity, u"1 week");
     EXPECT_EQ(list.entries[1].sendAs, u"Text");
 
-    // A count stored as text, negative or absurd.
+    // A count negative or absurd (one stored as text: OtherTypeReadsAsMissing).
     SetInt(u"SettingsMessagesCenters", -3);
     EXPECT_TRUE(LoadCentres(store_).entries.empty());
     SetInt(u"SettingsMessagesCenters", 2000000000);
@@ -91,6 +91,92 @@ TEST_F(CentresTest, MissingWrongTypeAndOutOfRangeReadAsDefaults) {
     SetInt(u"SettingsMessagesUseSIMDefault", 0);
     EXPECT_FALSE(LoadCentres(store_).useSimDefault);
     EXPECT_FALSE(LoadCentres(store_).simDefaultAbsent);
+}
+
+CentreEntry With(CentreEntry entry, std::u16string CentreEntry::*field, const char16_t* value) {
+    entry.*field = value;
+    return entry;
+}
+
+// A value stored with the other type (by hand, or by another program's mistake) reads as if
+// it were missing; the other keys still read normally.
+TEST(CentreSettings, OtherTypeReadsAsMissing) {
+    struct Expected {
+        size_t entries;
+        int chosen;
+        bool useSimDefault, simDefaultAbsent;
+        CentreEntry first;
+    };
+    CentreEntry home;
+    home.name = u"Home";
+    home.number = u"+306900000";
+    home.validity = u"24 hours";
+    home.sendAs = u"Fax";
+    const struct {
+        const char16_t* key;   // nullptr: every key of its own type
+        const char16_t* text;  // stored as text when set, else as the number
+        int32_t number;
+        Expected expected;
+    } cases[] = {
+        {nullptr, nullptr, 0, {2, 1, false, false, home}},
+        {u"SettingsMessagesCenters", u"2", 0, {0, -1, false, false, {}}},
+        {u"SettingsMessagesChosenCenter", u"1", 0, {2, -1, false, false, home}},
+        {u"SettingsMessagesUseSIMDefault", u"0", 0, {2, 1, true, true, home}},
+        {u"SettingsSMSC_Name0",
+         nullptr,
+         7,
+         {2, 1, false, false, With(home, &CentreEntry::name, u"Nil")}},
+        {u"SettingsSMSC_Number0",
+         nullptr,
+         306900000,
+         {2, 1, false, false, With(home, &CentreEntry::number, u"12345678")}},
+        {u"SettingsSMSC_Validity0",
+         nullptr,
+         23,
+         {2, 1, false, false, With(home, &CentreEntry::validity, u"1 week")}},
+        {u"SettingsSMSC_SendAs0",
+         nullptr,
+         1,
+         {2, 1, false, false, With(home, &CentreEntry::sendAs, u"Text")}},
+    };
+    for (const auto& c : cases) {
+        const std::string label =
+            c.key ? std::string(c.key, c.key + std::char_traits<char16_t>::length(c.key)) : "none";
+        testing::TempFolder temp;
+        SettingsStore store(temp / "settings.db");
+        // The case's key is left out of the usual values and written with the other type.
+        const auto heldBack = [&](const char16_t* key) {
+            return c.key && std::u16string(key) == c.key;
+        };
+        const auto setInt = [&](const char16_t* key, int32_t value) {
+            if (!heldBack(key)) SetSettingInt(store, key, &value);
+        };
+        const auto setText = [&](const char16_t* key, const std::u16string& value) {
+            if (!heldBack(key)) SetSettingString(store, key, value.c_str());
+        };
+        setInt(u"SettingsMessagesCenters", 2);
+        setInt(u"SettingsMessagesChosenCenter", 1);
+        setInt(u"SettingsMessagesUseSIMDefault", 0);
+        setText(u"SettingsSMSC_Name0", home.name);
+        setText(u"SettingsSMSC_Number0", home.number);
+        setText(u"SettingsSMSC_Validity0", home.validity);
+        setText(u"SettingsSMSC_SendAs0", home.sendAs);
+        if (c.key && c.text) {
+            ASSERT_EQ(SetSettingString(store, c.key, c.text), 1) << label;
+        } else if (c.key) {
+            ASSERT_EQ(SetSettingInt(store, c.key, &c.number), 1) << label;
+        }
+
+        const CentreList list = LoadCentres(store);
+        EXPECT_EQ(list.entries.size(), c.expected.entries) << label;
+        EXPECT_EQ(list.chosen, c.expected.chosen) << label;
+        EXPECT_EQ(list.useSimDefault, c.expected.useSimDefault) << label;
+        EXPECT_EQ(list.simDefaultAbsent, c.expected.simDefaultAbsent) << label;
+        if (!list.entries.empty()) {
+            EXPECT_EQ(list.entries[0], c.expected.first) << label;
+            EXPECT_EQ(list.entries[1], CentreEntry{}) << label;
+        }
+    }
 }
 
 TEST_F(CentresTest, DeleteMovesLaterEntriesDownAndTheChoiceFollows) {

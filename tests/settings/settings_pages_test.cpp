@@ -458,6 +458,96 @@ TEST_P(SettingsPagesTest, ModemPageWritesTheCommandOnSelectionClickAndLeaving) {
     EXPECT_EQ(command(), u"AT+CBST=51,0,1;+CHSN=4,0,0,0");
 }
 
+// A stored value of the other type reads as if it were missing, and one out of range as its
+// default: the page opens on the first speed, on "Modem" (or no button for a method past the
+// three), and writes the command of what it shows.
+TEST_P(SettingsPagesTest, ModemPageReadsOtherTypesAndOutOfRangeAsTheFirstChoice) {
+    struct Stored {
+        const char16_t* text;  // stored as text when set, else as the number; absent when both
+        int32_t number;        // are unset (number -99)
+    };
+    const struct {
+        Stored method, speed;
+        int checked;  // the method button checked, -1 none
+        int row;
+        const char16_t* command;
+    } cases[] = {
+        {{nullptr, 2}, {nullptr, 3}, 2, 3, u"AT+CBST=51,0,1;+CHSN=4,0,0,0"},
+        {{nullptr, 2}, {u"3", 0}, 2, 0, u"AT+CBST=39,0,1;+CHSN=1,0,0,0"},
+        {{u"2", 0}, {nullptr, 3}, 0, 3, u"AT+CBST=0,0,1;+CHSN=4,0,0,0"},
+        {{u"", 0}, {u"4", 0}, 0, 0, u"AT+CBST=0,0,1;+CHSN=1,0,0,0"},
+        {{nullptr, -99}, {nullptr, -99}, 0, 0, u"AT+CBST=0,0,1;+CHSN=1,0,0,0"},
+        {{nullptr, 1}, {nullptr, -1}, 1, 0, u"AT+CBST=71,0,1;+CHSN=1,0,0,0"},
+        {{nullptr, 7}, {nullptr, 5}, -1, 0, u"AT+CBST=0,0,1;+CHSN=1,0,0,0"},
+    };
+    int n = 0;
+    for (const auto& c : cases) {
+        SCOPED_TRACE(n);
+        SettingsStore store(temp_ / ("modem" + std::to_string(n++) + ".db"));
+        ShellContext context{store, link_, dialogs_, temp_ / "run"};
+        const auto put = [&store](const char16_t* name, const Stored& value) {
+            if (value.text)
+                SetSettingString(store, name, value.text);
+            else if (value.number != -99)
+                SetSettingInt(store, name, &value.number);
+        };
+        put(u"SettingsModemMethod", c.method);
+        put(u"SettingsModemSpeed", c.speed);
+        ModemPage page(&host_, context, files_);
+        for (int m = 0; m < kModemMethodCount; ++m)
+            EXPECT_EQ(page.Method(m)->isChecked(), m == c.checked) << m;
+        EXPECT_EQ(page.Speeds()->currentRow(), c.row);
+        char16_t command[64] = u"";
+        ASSERT_EQ(GetSettingString(store, u"ATModemCmd", command, 64), 1);
+        EXPECT_EQ(std::u16string(command), c.command);
+        EXPECT_EQ(ReadAll(ModemInitValuePath(files_)),
+                  QString::fromStdU16String(c.command).toStdString() + "<cr>");
+    }
+}
+
+// The Messages page with a setting of the other type: a chosen centre stored as text is no
+// choice (nothing marked, nothing sent), "Use SIM Default" stored as text is missing (the SIM's
+// own centre is applied when the card connects).
+TEST_P(SettingsPagesTest, CentrePageReadsOtherTypesAsMissing) {
+    const struct {
+        bool useSimAsText, chosenAsText;
+        bool boxChecked;
+        std::vector<std::u16string> marks;
+        const char* cardCentre;
+    } cases[] = {
+        {false, false, false, {u"1", u"0"}, "+CSCA: \"+306900000\""},
+        {false, true, false, {u"0", u"0"}, "+CSCA: \"+301234\""},
+        {true, false, true, {u"0", u"0"}, "+CSCA: \"+3097100000\""},
+    };
+    int n = 0;
+    for (const auto& c : cases) {
+        SCOPED_TRACE(n);
+        ASSERT_NE(Card("AT+CSCA=\"+301234\"\r").find("OK"), std::string::npos);
+        SettingsStore store(temp_ / ("centres" + std::to_string(n++) + ".db"));
+        ShellContext context{store, link_, dialogs_, temp_ / "run"};
+        CentreEntry home;
+        home.name = u"Home";
+        home.number = u"+306900000";
+        SaveCentre(store, 0, home);
+        SaveCentre(store, 1, CentreEntry{});
+        if (c.useSimAsText)
+            SetSettingString(store, u"SettingsMessagesUseSIMDefault", u"0");
+        else
+            SaveUseSimDefault(store, false);
+        if (c.chosenAsText)
+            SetSettingString(store, u"SettingsMessagesChosenCenter", u"0");
+        else
+            SaveChosenCentre(store, 0);
+        CentrePage page(&host_, context);
+        Connected(page);
+        Settle(page);
+        EXPECT_EQ(qobject_cast<QCheckBox*>(FindControl(&page, kCentreUseSimId))->isChecked(),
+                  c.boxChecked);
+        EXPECT_EQ(Column(page.List(), 0, kCentreImageRole), c.marks);
+        EXPECT_NE(Card("AT+CSCA?\r").find(c.cardCentre), std::string::npos);
+    }
+}
+
 // Every page of the view as a person sees it on the narrow window, with a search listed and a
 // centre chosen, for a look at the layout.
 TEST_P(SettingsPagesTest, ScreenshotOfEveryPage) {
