@@ -68,8 +68,9 @@ bool CardWatch::PoweredUpOnRequest() {
         return false;
     }
     ui_.UpdateWindow();
-    card_.SendCompanion(kMsgCardPowerUp);
-    return true;
+    // A card manager that refuses has no card to power: opening the port could only fail, and
+    // the user is told the card is absent instead.
+    return card_.SendCompanion(kMsgCardPowerUp) != 0L;
 }
 
 bool CardWatch::ConnectIfReady() {
@@ -79,6 +80,8 @@ bool CardWatch::ConnectIfReady() {
     ui_.Foreground();
     busy_.BeginBusy();
     ui_.ShowStatus(u"Initializing...", u"");
+    // That line replaces whichever absence was shown, so the next absence is shown again.
+    app_.shownNoCard = app_.shownPoweredDown = 0;
     ui_.UpdateWindow();
     const int opened = ui_.RunAside([this] { return card_.OpenLink(); });
     busy_.EndBusy();
@@ -87,7 +90,8 @@ bool CardWatch::ConnectIfReady() {
         return true;
     }
     if (opened) SetCardState(2);
-    return true;
+    // A card pulled while it was being initialised is said to be gone at once.
+    return opened || card_.CardPresent();
 }
 
 void CardWatch::ShowAbsence() {

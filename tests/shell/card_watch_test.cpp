@@ -168,6 +168,33 @@ TEST_F(CardWatchTest, AFailedOpenStaysNotConnectedAndRetriesNextPass) {
     EXPECT_EQ(busy_.Count(), 0);
 }
 
+// The card out of its slot: the card manager refuses to power it, and the dialer neither
+// opens the port nor covers the absence with "Initializing..." on every pass.
+TEST_F(CardWatchTest, APowerUpRefusedForWantOfACardSaysNoCardOnce) {
+    card_.present = 0;
+    card_.powerUpAnswer = 0;
+    for (int i = 0; i < 3; ++i)
+        watch_.Tick();
+    EXPECT_EQ(card_.opens, 0);
+    EXPECT_EQ(ui_.statuses, std::vector<std::u16string>{u"No Card Phone inserted.|"});
+    EXPECT_EQ(busy_.Count(), 0);
+}
+
+// Pulled while it was being initialised: said at once, and again after each later attempt,
+// since "Initializing..." took the absence off the screen.
+TEST_F(CardWatchTest, ACardPulledDuringTheHandshakeIsSaidToBeGoneAtOnce) {
+    card_.answer = 1;
+    card_.openWorks = 0;
+    card_.present = 0;
+    watch_.Tick();
+    EXPECT_EQ(ui_.statuses,
+              (std::vector<std::u16string>{u"Initializing...|", u"No Card Phone inserted.|"}));
+    watch_.Tick();
+    EXPECT_EQ(ui_.statuses.size(), 4u);
+    EXPECT_EQ(ui_.statuses.back(), u"No Card Phone inserted.|");
+    EXPECT_EQ(app_.cardState, 1);
+}
+
 TEST_F(CardWatchTest, BusyIndicatorNestsAcrossThreads) {
     ui_.log.clear();
     busy_.BeginBusy();

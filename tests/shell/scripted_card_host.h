@@ -18,6 +18,7 @@ class ScriptedCardHost : public CardHost {
     bool CompanionExists() override { return companion; }
     std::optional<long> SendCompanion(unsigned msg) override {
         sent.push_back(msg);
+        if (msg == kMsgCardPowerUp) return powerUpAnswer;
         if (msg != kMsgCardPowerQuery) return 1;
         if (answers.empty()) return answer;
         const long next = answers.front();
@@ -32,6 +33,7 @@ class ScriptedCardHost : public CardHost {
     bool companion = true;
     long answer = 0;           // to the power query once answers is used up
     std::deque<long> answers;  // taken first, in order
+    long powerUpAnswer = 1;    // to a power-up request: 0 refuses it (no card in the slot)
     int openWorks = 1, opens = 0, closes = 0, present = 1;
     std::vector<unsigned> sent;
     std::vector<int> sleeps;
