@@ -66,6 +66,9 @@ void SimCacheBuild(PhonebookCaches& caches, Link& link, const CacheNotify& notif
         Notify(notify, kSimCacheDone);
         return;
     }
+    // A build always starts from nothing: stray bytes of a damaged file, or records of an
+    // earlier run, would put every record behind them out of step.
+    CacheDeleteFiles(group);
     const int storages[2] = {kStorageSimCard, kStorageCardPhone};
     bool stop = false;
     for (int file = 1; file <= 2 && !stop; ++file) {
@@ -99,6 +102,21 @@ void SimCacheBuild(PhonebookCaches& caches, Link& link, const CacheNotify& notif
     Notify(notify, kSimCacheDone);
 }
 
+namespace {
+
+// The builder on a thread of its own, counted as building from now until it lets the group go.
+void StartSimBuilder(PhonebookCaches& caches, Link& link, CacheNotify notify) {
+    ++caches.simBuilds;
+    caches.workers.Start([&caches, &link, notify = std::move(notify)] {
+        SimCacheBuild(caches, link, [&caches, &notify](unsigned msg) {
+            --caches.simBuilds;  // before the report, so whoever it reaches sees the build over
+            Notify(notify, msg);
+        });
+    });
+}
+
+}  // namespace
+
 void SimCacheLoad(PhonebookCaches& caches, Link& link, CacheNotify notify) {
     if (CachePresent(caches.sim)) {
         caches.workers.Start([&caches, notify = std::move(notify)] {
@@ -107,14 +125,17 @@ void SimCacheLoad(PhonebookCaches& caches, Link& link, CacheNotify notify) {
         });
         return;
     }
-    caches.workers.Start(
-        [&caches, &link, notify = std::move(notify)] { SimCacheBuild(caches, link, notify); });
+    StartSimBuilder(caches, link, std::move(notify));
 }
 
 void SimCacheRebuild(PhonebookCaches& caches, Link& link, CacheNotify notify) {
-    if (CachePresent(caches.sim)) CacheDeleteFiles(caches.sim);
-    caches.workers.Start(
-        [&caches, &link, notify = std::move(notify)] { SimCacheBuild(caches, link, notify); });
+    // Whether present or not: a damaged file is no cache, but left alone it would stay for good.
+    CacheDeleteFiles(caches.sim);
+    StartSimBuilder(caches, link, std::move(notify));
+}
+
+bool SimCacheBuilding(const PhonebookCaches& caches) {
+    return caches.simBuilds.load() > 0;
 }
 
 void OutlookCacheBuild(PhonebookCaches& caches, const AddressBookReader& read,
@@ -144,7 +165,8 @@ void OutlookCacheBuild(PhonebookCaches& caches, const AddressBookReader& read,
 }
 
 void OutlookCacheClear(PhonebookCaches& caches, CacheNotify notify) {
-    if (CachePresent(caches.outlook)) CacheDeleteFiles(caches.outlook);
+    // Damaged files go too: as the SIM's, they would otherwise stay for good.
+    CacheDeleteFiles(caches.outlook);
     caches.workers.Start([&caches, notify = std::move(notify)] {
         Pause(caches, kPauseMs);
         Notify(notify, kOutlookCacheDone);
@@ -153,7 +175,7 @@ void OutlookCacheClear(PhonebookCaches& caches, CacheNotify notify) {
 
 void OutlookCacheRebuild(PhonebookCaches& caches, AddressBookReader read, CacheErrorBox box,
                          CacheNotify notify) {
-    if (CachePresent(caches.outlook)) CacheDeleteFiles(caches.outlook);
+    CacheDeleteFiles(caches.outlook);
     caches.workers.Start(
         [&caches, read = std::move(read), box = std::move(box), notify = std::move(notify)] {
             OutlookCacheBuild(caches, read, box, notify);

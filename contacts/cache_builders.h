@@ -26,26 +26,32 @@ using AddressBookReader = std::function<AddressBookResult()>;
 // Shows the one message the address-book builder has for a person.
 using CacheErrorBox = std::function<void(const std::u16string& text)>;
 
-// The SIM builder's work on the calling thread: "SM" into file 1, then "ME" into file 2, in
-// runs of ten up to each storage's total, stopping a storage once its used count is read. A
-// storage that cannot be selected, or a run that gets no reply (the card was pulled), ends the
-// build; what was read stays in the files. Sends 1224 at the end, and when the group is busy.
+// The SIM builder's work on the calling thread: both files are deleted first, so the build
+// never lands behind what an earlier run or a damaged file left; then "SM" into file 1 and "ME"
+// into file 2, in runs of ten up to each storage's total, stopping a storage once its used
+// count is read. A storage that cannot be selected, or a run that gets no reply (the card was
+// pulled), ends the build; what was read stays in the files. Sends 1224 at the end, and when
+// the group is busy (then nothing is touched).
 void SimCacheBuild(PhonebookCaches& caches, Link& link, const CacheNotify& notify);
 // A cache that is present (an empty file counts) is reported done after 500 ms without a word
 // to the card; otherwise the builder thread starts.
 void SimCacheLoad(PhonebookCaches& caches, Link& link, CacheNotify notify);
-// Deletes a present SIM cache and starts the builder thread.
+// Deletes the SIM cache, present or damaged, and starts the builder thread.
 void SimCacheRebuild(PhonebookCaches& caches, Link& link, CacheNotify notify);
+// True from the moment SimCacheLoad or SimCacheRebuild starts a builder thread until that
+// thread has let the group go, just before its 1224. Meanwhile the files are missing or partial,
+// so a free place found in them may be taken on the card.
+bool SimCacheBuilding(const PhonebookCaches& caches);
 
 // The address-book builder's work on the calling thread. A source that cannot be loaded at all
 // shows "<library> is missing." through box; an empty one writes nothing and leaves the lock
 // alone. Sends 1124 on every way out.
 void OutlookCacheBuild(PhonebookCaches& caches, const AddressBookReader& read,
                        const CacheErrorBox& box, const CacheNotify& notify);
-// Deletes a present address-book cache, waits 500 ms and reports 1124 (from a thread, so the
-// caller is not held).
+// Deletes the address-book cache (present or damaged), waits 500 ms and reports 1124 (from a
+// thread, so the caller is not held).
 void OutlookCacheClear(PhonebookCaches& caches, CacheNotify notify);
-// Deletes a present address-book cache and starts the builder thread.
+// Deletes the address-book cache (present or damaged) and starts the builder thread.
 void OutlookCacheRebuild(PhonebookCaches& caches, AddressBookReader read, CacheErrorBox box,
                          CacheNotify notify);
 

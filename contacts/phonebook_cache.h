@@ -110,6 +110,8 @@ struct PhonebookCaches {
     // The pauses of the builders and reporters (500 ms between storages, before a "done"
     // without a build); tests shorten them.
     std::function<void(int ms)> pause;
+    // SIM builds started and not yet ended (cache_builders.h: SimCacheBuilding).
+    std::atomic<int> simBuilds{0};
     // Declared last: threads still running use the groups above, so they are joined first.
     CacheWorkers workers;
 };

@@ -353,6 +353,75 @@ TEST_F(CacheBuildersTest, TheDemoSimIsCopiedWholeAndLookedUpByNumber) {
     EXPECT_FALSE(SimFile(2).empty());
 }
 
+// Whatever the files held before, a build leaves exactly the card's books: stray bytes of a
+// damaged file, which no load takes for a cache, and records of an earlier run go first.
+TEST_F(CacheBuildersTest, ABuildStartsFromEmptyFiles) {
+    cardsim::SimConfig config;
+    config.baud = 0;
+    config.runtimeDir = temp_ / "sim";
+    config.stateFile = temp_ / "card.state";
+    cardsim::CardSim sim(config);
+    ASSERT_TRUE(sim.PowerUp());
+    ASSERT_EQ(PortOpenDevice(*link_, sim.DevicePath().c_str()), 1);
+    int32_t simUsed = 0, cardUsed = 0, total = 0;
+    ASSERT_EQ(PhonebookSelect(*link_, kStorageSimCard), 0);
+    ASSERT_EQ(PhonebookGetUsage(*link_, &simUsed, &total), 1);
+    ASSERT_EQ(PhonebookSelect(*link_, kStorageCardPhone), 0);
+    ASSERT_EQ(PhonebookGetUsage(*link_, &cardUsed, &total), 1);
+
+    const std::string record(kPhonebookEntrySize, '\x01');
+    enum class Run { Build, Load, Rebuild };
+    struct Case {
+        const char* what;
+        std::string file1, file2;
+        Run run;
+    };
+    const Case cases[] = {
+        {"a damaged SIM file, rebuilt", record + record + "junk", "", Run::Rebuild},
+        {"a damaged SIM file beside a good Card Phone file, rebuilt", "junk", record, Run::Rebuild},
+        {"a damaged Card Phone file alone, loaded", "", "xyz", Run::Load},
+        {"an earlier run's records, built again", record + record + record, record, Run::Build},
+    };
+    // Between the books a started build counts as building; one run on the caller's thread
+    // is the caller's own business.
+    std::vector<bool> building;
+    caches_.pause = [&](int) {
+        std::lock_guard<std::mutex> lock(mutex_);
+        building.push_back(SimCacheBuilding(caches_));
+    };
+    size_t reports = 0;
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.what);
+        {
+            std::lock_guard<std::mutex> lock(mutex_);
+            building.clear();
+        }
+        for (int n = 1; n <= 2; ++n) {
+            const std::string& content = n == 1 ? c.file1 : c.file2;
+            fs::remove(CachePath(caches_.sim, n));
+            if (!content.empty())
+                std::ofstream(CachePath(caches_.sim, n), std::ios::binary) << content;
+        }
+        if (c.run == Run::Build) SimCacheBuild(caches_, *link_, Notifier());
+        if (c.run == Run::Load) SimCacheLoad(caches_, *link_, Notifier());
+        if (c.run == Run::Rebuild) SimCacheRebuild(caches_, *link_, Notifier());
+        EXPECT_EQ(WaitReports(++reports).back(), kSimCacheDone);
+        caches_.workers.JoinAll();
+        EXPECT_FALSE(SimCacheBuilding(caches_));
+        EXPECT_EQ(building, std::vector<bool>(2, c.run != Run::Build));
+        for (int n = 1; n <= 2; ++n) {
+            SCOPED_TRACE(n);
+            std::error_code error;
+            const auto bytes = fs::file_size(CachePath(caches_.sim, n), error);
+            ASSERT_FALSE(error);
+            EXPECT_EQ(bytes % kPhonebookEntrySize, 0u);
+            EXPECT_EQ(static_cast<int>(SimFile(n).size()), n == 1 ? simUsed : cardUsed);
+        }
+        EXPECT_TRUE(CachePresent(caches_.sim));
+    }
+    PortClose(*link_);
+}
+
 TEST_F(CacheBuildersTest, ACardPulledBetweenTheBooksLeavesTheSimBookWhole) {
     cardsim::SimConfig config;
     config.baud = 0;
