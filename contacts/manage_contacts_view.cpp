@@ -506,9 +506,22 @@ ManageContactsView::Row ManageContactsView::RowOf(QTreeWidgetItem* item) const {
     return row;
 }
 
+bool ManageContactsView::SimBooksReady() const {
+    return state_.sim == 2 && !SimCacheBuilding(*caches_);
+}
+
+bool ManageContactsView::RefuseWhileReading() {
+    if (SimBooksReady()) return false;
+    // The free place comes from the cache: while it is missing or half written, the first
+    // place would be taken and the card's own entry there overwritten.
+    Box(kContactsStillReadingText);
+    return true;
+}
+
 std::vector<FileMenuEntry> ManageContactsView::FileMenuEntries() {
     const bool simPage = IsSimPage(CurrentPage());
-    return {{u"Import vCard File...", kCmdContactImport, simPage && cardState_() == 2},
+    return {{u"Import vCard File...", kCmdContactImport,
+             simPage && cardState_() == 2 && SimBooksReady()},
             {u"Export vCard File...", kCmdContactExport, simPage}};
 }
 
@@ -523,11 +536,12 @@ QMenu* ManageContactsView::PrepareMenu(int page, QPoint pos) {
     }
     const bool onRow = tapped != nullptr || !list->selectedItems().isEmpty();
     const bool connected = cardState_() == 2;
+    const bool ready = SimBooksReady();  // the commands that take a free place
     for (QAction* action : menu->actions()) {
         bool enabled = true;
         switch (action->data().toInt()) {
             case kCmdContactNew:
-                enabled = connected && IsSimPage(page);
+                enabled = connected && ready && IsSimPage(page);
                 break;
             case kCmdContactEdit:
                 enabled = connected && IsSimPage(page) && onRow;
@@ -542,10 +556,12 @@ QMenu* ManageContactsView::PrepareMenu(int page, QPoint pos) {
                 break;
             case kCmdContactCopyToSim:
             case kCmdContactCopyToCard:
-                enabled = connected && onRow;
+                enabled = connected && ready && onRow;
+                break;
+            case kCmdContactImport:
+                enabled = connected && ready;
                 break;
             case kCmdContactRefresh:
-            case kCmdContactImport:
                 enabled = connected;
                 break;
             default:
@@ -635,6 +651,7 @@ bool ManageContactsView::RunContactDialog(ContactDialog& dialog, const StorageLi
 }
 
 void ManageContactsView::NewContact(int page) {
+    if (RefuseWhileReading()) return;
     const std::string code = StorageOfPage(page);
     const StorageLimits limits = ReadStorageLimits(context_.settings, code);
     const int index = SimCacheNextFreeIndex(caches_->sim, FileOfStorage(code));
@@ -676,6 +693,7 @@ void ManageContactsView::EditContact(int page) {
 }
 
 void ManageContactsView::CopyTo(int page, const std::string& target) {
+    if (RefuseWhileReading()) return;
     std::vector<Row> rows;
     for (QTreeWidgetItem* item : ChosenRows(page))
         rows.push_back(RowOf(item));
@@ -708,7 +726,8 @@ void ManageContactsView::CopyRows(const std::vector<Row>& rows, const std::strin
             number = U(dialog.Number()->text());
         }
         const PhonebookEntry entry = MakeEntry(index, name, number);
-        if (OnCard([&] { return PhonebookWriteEntry(context_.link, target.c_str(), entry); }) != 0) {
+        if (OnCard([&] { return PhonebookWriteEntry(context_.link, target.c_str(), entry); }) !=
+            0) {
             Box(u"Cannot write phonebook entry.");
             break;
         }
@@ -746,6 +765,7 @@ void ManageContactsView::Refresh(int page) {
 }
 
 void ManageContactsView::ImportVCard(int page) {
+    if (RefuseWhileReading()) return;
     std::string path;
     if (vcardPath_) {
         path = vcardPath_(false);

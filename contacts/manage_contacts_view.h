@@ -54,6 +54,11 @@ inline constexpr int kCmdContactNew = 40021, kCmdContactEdit = 40015, kCmdContac
 // The vCard commands of the SIM Card and Card Phone pages.
 inline constexpr int kCmdContactImport = 40031, kCmdContactExport = 40032;
 
+// The refusal of New, Copy To and Import while the SIM and Card Phone lists are not read whole.
+inline constexpr char16_t kContactsStillReadingText[] =
+    u"The SIM Card and Card Phone contacts are still being read. Please try again once they "
+    u"are listed.";
+
 // The New/Edit dialog ("New Contacts" / "Edit Contacts") and the "Copy Contacts" dialog, which
 // adds the reason and the old name and number above the fields. OK runs the check first, so a
 // person sees the message and keeps the dialog.
@@ -101,6 +106,9 @@ class ManageContactsView : public View {
     void Find();
 
     const ContactsLoadState& LoadState() const { return state_; }
+    // The SIM Card and Card Phone lists are read whole and no build of their cache runs: only
+    // then is the free place New, Copy To and Import write to known.
+    bool SimBooksReady() const;
     PhonebookCaches& Caches() { return *caches_; }
     void SetCardStateSource(std::function<int()> source) { cardState_ = std::move(source); }
     // Where the Outlook builder reads the address book from; the desktop's by default.
@@ -133,6 +141,8 @@ class ManageContactsView : public View {
     int Box(const std::u16string& text);
     // Runs a contact dialog until its fields pass the check against limits, or it is cancelled.
     bool RunContactDialog(ContactDialog& dialog, const StorageLimits& limits);
+    // Says so and returns true while the SIM books are not ready.
+    bool RefuseWhileReading();
     void NewContact(int page);
     void EditContact(int page);
     void CopyTo(int page, const std::string& target);

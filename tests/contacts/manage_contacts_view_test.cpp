@@ -15,11 +15,13 @@
 #include <QPushButton>
 #include <QTreeWidget>
 #include <chrono>
+#include <condition_variable>
 #include <deque>
 #include <filesystem>
 #include <fstream>
 #include <functional>
 #include <memory>
+#include <mutex>
 #include <thread>
 
 #include "cardsim/card_sim.h"
@@ -216,6 +218,110 @@ TEST_F(ManageContactsViewTest, NewEditCopyAndDeleteReachTheCardAndTheLists) {
     EXPECT_TRUE(boxes_.empty());
 }
 
+// Holds the thread that calls Hold until Open (at most 30 s).
+struct Gate {
+    void Hold() {
+        std::unique_lock<std::mutex> lock(mutex);
+        held = true;
+        changed.notify_all();
+        changed.wait_for(lock, std::chrono::seconds(30), [this] { return open; });
+    }
+    bool WaitHeld() {
+        std::unique_lock<std::mutex> lock(mutex);
+        return changed.wait_for(lock, std::chrono::seconds(30), [this] { return held; });
+    }
+    void Open() {
+        std::lock_guard<std::mutex> lock(mutex);
+        open = true;
+        changed.notify_all();
+    }
+    std::mutex mutex;
+    std::condition_variable changed;
+    bool held = false, open = false;
+};
+
+// New, Copy To and Import take the first free place the cache shows; while the cache is not
+// read yet, or is being rebuilt, it shows none taken, and place 1 on the card (Alice's) would be
+// overwritten. Each is refused with its own message until the lists are whole again.
+TEST_F(ManageContactsViewTest, NothingTakesAFreePlaceWhileTheListsAreRead) {
+    const std::string cardOne = CardEntry("ME", 1).text;
+    ASSERT_FALSE(cardOne.empty());
+    ManageContactsView& view = Make();  // not shown yet: nothing read
+    int vcardAsked = 0;
+    view.SetVCardPathSource([&](bool) {
+        ++vcardAsked;
+        return std::string(temp_ / "absent.vcf");
+    });
+    auto refusedCommands = [&](const char* when) {
+        SCOPED_TRACE(when);
+        boxes_.clear();
+        answers_.clear();
+        Fill("Zed Test", "+4930123");
+        view.ShowPage(kContactsSimPage);
+        view.Command(kCmdContactNew);
+        view.Command(kCmdContactImport);
+        Select(kContactsSimPage, "Bob Jones");
+        view.Command(kCmdContactCopyToCard);
+        EXPECT_EQ(boxes_, std::vector<std::u16string>(3, kContactsStillReadingText));
+        EXPECT_EQ(answers_.size(), 1u);  // no dialog was opened
+        EXPECT_EQ(vcardAsked, 0);
+        EXPECT_STREQ(CardEntry("SM", 1).text, "Alice Smith");
+        EXPECT_EQ(std::string(CardEntry("ME", 1).text), cardOne);
+        // Greyed where a person would choose them.
+        QMenu* menu = view.PrepareMenu(kContactsSimPage, QPoint(-5, -5));
+        for (QAction* action : menu->actions()) {
+            const int id = action->data().toInt();
+            if (id == kCmdContactNew || id == kCmdContactCopyToCard || id == kCmdContactImport) {
+                EXPECT_FALSE(action->isEnabled()) << id;
+            }
+            if (id == kCmdContactRefresh || id == kCmdContactExport) {
+                EXPECT_TRUE(action->isEnabled()) << id;
+            }
+        }
+        EXPECT_FALSE(view.FileMenuEntries().front().enabled);
+    };
+    refusedCommands("before the first load");
+
+    // Loaded: then a Refresh whose builder is held after the SIM's book, with the cache's
+    // write state its own and the Card Phone's file not read yet.
+    view.OnMessage(kMsgViewShown, 0, 0);
+    ASSERT_TRUE(WaitUntil([&] { return view.LoadState().sim == 2; }));
+    auto gate = std::make_shared<Gate>();  // shared: the builder may outlive a failed test
+    caches_.pause = [gate](int) { gate->Hold(); };
+    const std::unique_ptr<Gate, void (*)(Gate*)> opened(gate.get(), [](Gate* g) { g->Open(); });
+    view.ShowPage(kContactsSimPage);
+    view.Command(kCmdContactRefresh);
+    ASSERT_TRUE(gate->WaitHeld());
+    refusedCommands("during a rebuild");
+    gate->Open();
+    ASSERT_TRUE(WaitUntil([&] { return view.LoadState().sim == 2 && !caches_.workers.Busy(); }));
+
+    // A build another view started (the picker's load finding no cache) while this one's lists
+    // stand loaded.
+    auto other = std::make_shared<Gate>();
+    caches_.pause = [other](int) { other->Hold(); };
+    const std::unique_ptr<Gate, void (*)(Gate*)> otherOpened(other.get(),
+                                                             [](Gate* g) { g->Open(); });
+    CacheDeleteFiles(caches_.sim);
+    SimCacheLoad(caches_, link_, {});
+    ASSERT_TRUE(other->WaitHeld());
+    ASSERT_EQ(view.LoadState().sim, 2);
+    refusedCommands("during another view's build");
+    other->Open();
+    ASSERT_TRUE(WaitUntil([&] { return !caches_.workers.Busy(); }));
+    EXPECT_EQ(std::string(CardEntry("ME", 1).text), cardOne);
+
+    // Read whole again: New takes the first place the card leaves free.
+    boxes_.clear();
+    answers_.clear();
+    Fill("Zed Test", "+4930123");
+    view.ShowPage(kContactsSimPage);
+    view.Command(kCmdContactNew);
+    EXPECT_TRUE(boxes_.empty());
+    EXPECT_STREQ(CardEntry("SM", 9).text, "Zed Test");
+    EXPECT_STREQ(CardEntry("SM", 1).text, "Alice Smith");
+}
+
 TEST_F(ManageContactsViewTest, TheDialogRefusesUntilTheFieldsFit) {
     ManageContactsView& view = MakeLoaded();
     view.ShowPage(kContactsSimPage);
@@ -364,8 +470,9 @@ TEST_F(ManageContactsViewTest, VCardExportAndImport) {
     view.SetVCardPathSource([&](bool saving) { return saving ? unwritable : missing; });
     view.Command(kCmdContactImport);
     view.Command(kCmdContactExport);
-    EXPECT_EQ(boxes_, (std::vector<std::u16string>{Utf8ToUtf16("Cannot read " + missing + "."),
-                                                   Utf8ToUtf16("Cannot write " + unwritable + ".")}));
+    EXPECT_EQ(boxes_,
+              (std::vector<std::u16string>{Utf8ToUtf16("Cannot read " + missing + "."),
+                                           Utf8ToUtf16("Cannot write " + unwritable + ".")}));
     EXPECT_EQ(Names(kContactsSimPage).size(), 8 + cardRows);
 }
 
