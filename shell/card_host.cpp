@@ -43,7 +43,16 @@ int LinkCardHost::CardPresent() {
 }
 
 void LinkCardHost::Sleep(int ms) {
-    std::this_thread::sleep_for(std::chrono::milliseconds(ms));
+    std::unique_lock<std::mutex> lock(stopMutex_);
+    stopped_.wait_for(lock, std::chrono::milliseconds(ms), [this] { return stopping_; });
+}
+
+void LinkCardHost::StopWaiting() {
+    {
+        std::lock_guard<std::mutex> lock(stopMutex_);
+        stopping_ = true;
+    }
+    stopped_.notify_all();
 }
 
 }  // namespace vqm

@@ -1,6 +1,8 @@
 // The card watch's way to the card manager (over its socket) and to the card (the link).
 #pragma once
 
+#include <condition_variable>
+#include <mutex>
 #include <string>
 
 #include "link/link.h"
@@ -22,11 +24,15 @@ class LinkCardHost : public CardHost {
     void CloseLink() override;
     int CardPresent() override;
     void Sleep(int ms) override;
+    void StopWaiting() override;
 
   private:
     Link& link_;
     const std::string companionPath_;
     MessageLayer* messages_;
+    std::mutex stopMutex_;
+    std::condition_variable stopped_;
+    bool stopping_ = false;
 };
 
 }  // namespace vqm

@@ -42,8 +42,13 @@ void CardWatch::Tick() {
         }
         const long answer = card_.SendCompanion(kMsgCardPowerQuery).value_or(-1);
         if (answer == 2) {
-            // Still powering up: block and ask again, as the card manager expects.
-            card_.Sleep(kCompanionBusySleepMs);
+            // Still powering up: wait and ask again, as the card manager expects. The wait runs
+            // aside so that the window keeps painting and an exit meanwhile cuts it short.
+            ui_.RunAside([this] {
+                card_.Sleep(kCompanionBusySleepMs);
+                return 1;
+            });
+            if (ui_.ShuttingDown()) return;
             continue;
         }
         if ((answer == 1 || (answer == 0 && PoweredUpOnRequest())) && ConnectIfReady()) return;

@@ -55,7 +55,9 @@ class CardHost {
     virtual int OpenLink() = 0;  // opens and initialises the serial link: 1 or 0
     virtual void CloseLink() = 0;
     virtual int CardPresent() = 0;
+    // Waits ms, or less once StopWaiting was called (from any thread).
     virtual void Sleep(int ms) = 0;
+    virtual void StopWaiting() {}
 };
 
 // A nesting busy indicator that worker threads may use too.

@@ -366,6 +366,7 @@ void MainWindow::ShowAbout() {
 void MainWindow::Shutdown() {
     if (shutDown_) return;
     shutDown_ = true;
+    card_.StopWaiting();  // a wait for a card manager still powering up ends now
     watchTimer_.stop();
     if (app_.cardState == 2) card_.CloseLink();
     messages_.Close();

@@ -39,11 +39,13 @@ class RecordingUi : public ShellUi {
         log.push_back((enable ? "enable " : "disable ") + std::to_string(index));
     }
     void ShowDialPad() override { log.push_back("dialpad"); }
+    bool ShuttingDown() const override { return shuttingDown; }
     void SendToViews(unsigned msg, long, long) override {
         log.push_back("views " + std::to_string(msg));
     }
 
     int boxAnswer = kIdOk;
+    bool shuttingDown = false;
     unsigned lastStyle = 0;
     std::vector<std::u16string> boxes, statuses;
     std::vector<std::string> log;
@@ -93,6 +95,15 @@ TEST_F(CardWatchTest, ACompanionStillPoweringUpKeepsTheWatchWaiting) {
     watch_.Tick();
     EXPECT_EQ(card_.opens, 1);
     EXPECT_EQ(ui_.statuses.size(), 1u);
+}
+
+TEST_F(CardWatchTest, AnExitWhileTheCardPowersUpEndsTheWatchAfterOneWait) {
+    card_.answers = {2, 2, 1};
+    ui_.shuttingDown = true;
+    watch_.Tick();
+    EXPECT_EQ(card_.sleeps, std::vector<int>{5000});
+    EXPECT_EQ(card_.opens, 0);
+    EXPECT_TRUE(ui_.statuses.empty());
 }
 
 TEST_F(CardWatchTest, DecliningThePowerUpQuestionSuppressesItForTheRun) {
