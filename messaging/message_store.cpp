@@ -419,6 +419,12 @@ int SmsNoteNewMessageAgain(SettingsStore& settings, int location) {
 }
 
 int SmsIntakeNew(MessageStore& store, Link& link) {
+    if (!SmsIntakeRead(store, link)) return 0;
+    SmsIntakeFile(store);
+    return 1;
+}
+
+int SmsIntakeRead(MessageStore& store, Link& link) {
     std::string list;
     if (!ReadList(store.settings, kNewIdx, &list)) return 0;
     Call(store.hooks.beginBusy);
@@ -436,9 +442,12 @@ int SmsIntakeNew(MessageStore& store, Link& link) {
         }
     }
     Call(store.hooks.endBusy);
+    return 1;
+}
+
+void SmsIntakeFile(MessageStore& store) {
     if (store.hooks.pasteInto) store.hooks.pasteInto(kPageInbox);
     Call(store.hooks.selectFirstUnread);
-    return 1;
 }
 
 int ClipboardAppend(MessageStore& store, const SmsRecord& record) {

@@ -149,8 +149,11 @@ int SmsNoteNewMessage(SettingsStore& settings, Link& link, int location,
                       const std::function<void(int full)>& simFullAlert);
 int SmsNoteNewMessageAgain(SettingsStore& settings, int location);
 // Reads every "NewIdx" location into the transfer file and files it into the Inbox. 1 when
-// the new messages were taken in.
+// the new messages were taken in. The two halves apart: the card's part (any thread) and the
+// filing into the folders view's pages (its own thread).
 int SmsIntakeNew(MessageStore& store, Link& link);
+int SmsIntakeRead(MessageStore& store, Link& link);
+void SmsIntakeFile(MessageStore& store);
 
 // Transfer file. Append one entry (header words 0); ClipboardCopyRecord then files it into the
 // Sent page, the text variant (what the write view saves) into the Draft page.

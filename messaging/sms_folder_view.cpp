@@ -469,8 +469,9 @@ long SmsFolderView::OnMessage(unsigned msg, long wParam, long) {
                 StartRefresh();
             } else if (refreshState_ == kFolderRefreshed &&
                        IndexListCount(context_.settings, kNewIdx) > 0) {
-                // On the window's thread: the intake files into the pages as it goes.
-                SmsIntakeNew(store_, context_.link);
+                // The card is read aside; the filing, which fills the lists, stays here.
+                if (OnCard([this] { return SmsIntakeRead(store_, context_.link); }))
+                    SmsIntakeFile(store_);
             }
             break;
         case kMsgSimRefreshDone:
