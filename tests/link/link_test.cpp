@@ -196,6 +196,70 @@ TEST_F(LinkTest, SecondOpenOfAHeldPortIsRefused) {
     EXPECT_EQ(PortOpenDevice(second, card.Device().c_str()), 1);
 }
 
+// The port goes to waiting parties in the order they asked for it, a try never jumps the
+// queue, and closing the port sends every waiter away empty-handed.
+TEST_F(LinkTest, PortLockServesWaitersFirstComeFirstServed) {
+    Link link(settings_, DriverRoots{folder_ + "/run", folder_ + "/tty"});
+    link.portState.store(1);  // open and free, as PortOpen leaves it
+    ASSERT_EQ(PortLock(link), 1);
+
+    std::mutex orderMutex;
+    std::vector<int> order;
+    std::vector<std::thread> waiters;
+    for (int i = 0; i < 4; ++i) {
+        const unsigned long before = link.nextTicket;
+        waiters.emplace_back([&, i] {
+            if (PortLock(link) != 1) return;
+            {
+                std::lock_guard<std::mutex> lock(orderMutex);
+                order.push_back(i);
+            }
+            PortUnlock(link);
+        });
+        // The next waiter asks only once this one holds its ticket.
+        ASSERT_TRUE(testing::WaitFor([&] {
+            std::lock_guard<std::mutex> lock(link.portMutex);
+            return link.nextTicket == before + 1;
+        }));
+    }
+    PortUnlock(link);
+    for (auto& waiter : waiters)
+        waiter.join();
+    EXPECT_EQ(order, (std::vector<int>{0, 1, 2, 3}));
+
+    // While someone waits, a try is refused even at the moment the port is free; the port
+    // then goes to the waiter.
+    auto waitForWaiter = [&] {
+        return testing::WaitFor([&] {
+            std::lock_guard<std::mutex> lock(link.portMutex);
+            return link.nextTicket > link.servingTicket;
+        });
+    };
+    ASSERT_EQ(PortLock(link), 1);
+    std::atomic<int> lateResult{-1};
+    std::thread late([&] { lateResult = PortLock(link); });
+    ASSERT_TRUE(waitForWaiter());
+    {
+        std::lock_guard<std::mutex> lock(link.portMutex);
+        link.portState.store(1);  // free, the waiter not yet told
+    }
+    EXPECT_EQ(PortTryLock(link), 0);
+    link.portChanged.notify_all();
+    late.join();
+    EXPECT_EQ(lateResult.load(), 1);
+
+    // The port closes while someone waits: the waiter gives up instead of waiting for ever.
+    std::thread closed([&] { lateResult = PortLock(link); });
+    ASSERT_TRUE(waitForWaiter());
+    {
+        std::lock_guard<std::mutex> lock(link.portMutex);
+        link.portState.store(0);
+    }
+    link.portChanged.notify_all();
+    closed.join();
+    EXPECT_EQ(lateResult.load(), 0);
+}
+
 TEST_F(LinkTest, QueriesReadTheirReplies) {
     const std::pair<const char*, int> bars[] = {{"99", 4}, {"31", 4}, {"30", 3},
                                                 {"24", 3}, {"23", 2}, {"8", 1},
@@ -311,8 +375,8 @@ TEST_F(LinkTest, SilentCardWaitsUntilThePortCloses) {
         result = AtCommand(*link, "AT+SILENT\r", reply, sizeof reply);
     });
     // Still waiting for an answer 300 ms on.
-    EXPECT_FALSE(testing::WaitFor([&] { return result.load() != 99u; },
-                                  std::chrono::milliseconds(300)));
+    EXPECT_FALSE(
+        testing::WaitFor([&] { return result.load() != 99u; }, std::chrono::milliseconds(300)));
     // Meanwhile a periodic poll gives up rather than queue behind it.
     char reply[256];
     EXPECT_EQ(AtCommandTry(*link, "AT+CSQ\r", reply, sizeof reply), 0u);
