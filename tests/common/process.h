@@ -55,6 +55,22 @@ class Background {
         pid_ = -1;
         return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
     }
+    // True while the program has not ended; a program that ended (a crash too) is reaped and
+    // its wait status kept for EndedBy().
+    bool Running() {
+        if (pid_ <= 0) return false;
+        int status = 0;
+        if (waitpid(pid_, &status, WNOHANG) != pid_) return true;
+        ended_ = status;
+        pid_ = -1;
+        return false;
+    }
+    // How a program Running() found ended: "exit N", "signal N", or "" while not known.
+    std::string EndedBy() const {
+        if (ended_ < 0) return "";
+        if (WIFSIGNALED(ended_)) return "signal " + std::to_string(WTERMSIG(ended_));
+        return "exit " + std::to_string(WEXITSTATUS(ended_));
+    }
     // Sends SIGTERM and waits: the exit status, or -1.
     int Stop() {
         if (pid_ <= 0) return -1;
@@ -67,6 +83,7 @@ class Background {
 
   private:
     pid_t pid_ = -1;
+    int ended_ = -1;
 };
 
 }  // namespace vqm::testing

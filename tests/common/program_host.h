@@ -8,6 +8,7 @@
 #include <sys/stat.h>
 
 #include <chrono>
+#include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <optional>
@@ -27,6 +28,7 @@ class ProgramHost {
   public:
     static constexpr unsigned kCommand = 273;  // a menu or control click (WM_COMMAND)
     static constexpr int kExit = 40016;        // File > Exit
+    static constexpr int kDigitZero = 1126;    // the DialPad's 0 key; 1..9 follow
 
     // ownConfig: the programs' XDG_CONFIG_HOME in the test's folder too (the Settings pages
     // write the modem's files there); without it they keep the user's.
@@ -97,7 +99,28 @@ class ProgramHost {
             ++count;
         return count;
     }
+    // The DialPad's digit keys, clicked in turn.
+    void Type(const std::string& digits) {
+        for (char c : digits)
+            Command(kDigitZero + (c - '0'));
+    }
+    // `vqm-cardsim ctl status` shows text within limit.
+    bool CardShows(const std::string& text,
+                   std::chrono::milliseconds limit = std::chrono::seconds(20)) const {
+        return WaitFor([&] { return Ctl("status").first.find(text) != std::string::npos; }, limit);
+    }
+
     std::string Log() const { return Read(temp_ / "ui.log"); }
+    // The wall-clock time (seconds since the epoch) of the occurrence'th line (from 1) of the
+    // ui log that holds text; nothing when there are fewer such lines.
+    std::optional<double> LogTime(const std::string& text, size_t occurrence = 1) const {
+        std::istringstream lines(Log());
+        std::string line;
+        while (std::getline(lines, line))
+            if (line.find(text) != std::string::npos && --occurrence == 0)
+                return std::strtod(line.c_str(), nullptr);
+        return std::nullopt;
+    }
     size_t Count(const std::string& what) const { return Occurrences(Log(), what); }
     // The ui log shows text at least times times within limit.
     bool LogShows(const std::string& text,
