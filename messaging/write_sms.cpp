@@ -171,19 +171,25 @@ SendBox SendEndBox(const SendOutcome& outcome) {
     }
 }
 
-bool PrepareSend(const std::u16string& recipientsField, const std::u16string& textField,
-                 const std::function<bool(const std::u16string& question)>& ask,
-                 PreparedSend* prepared) {
-    const std::u16string recipients = recipientsField.substr(0, kRecipientsReadLimit);
-    if (recipients.empty()) return false;
+bool PrepareBody(const std::u16string& textField,
+                 const std::function<bool(const std::u16string& question)>& ask, SmsRecord* body) {
     const MessageCount count = CountMessage(textField);
     std::u16string text = textField.substr(0, kTextSendReadLimit);
     if (text.empty()) return false;
     const LengthCheck check = CheckLength(text, count.coding);
     if (check.ask && !(ask && ask(check.question))) return false;
     text.resize(check.cut);
+    *body = SmsRecord{};
+    return RecordBodyFromText(text.data(), text.size(), body) >= 1;
+}
+
+bool PrepareSend(const std::u16string& recipientsField, const std::u16string& textField,
+                 const std::function<bool(const std::u16string& question)>& ask,
+                 PreparedSend* prepared) {
+    const std::u16string recipients = recipientsField.substr(0, kRecipientsReadLimit);
+    if (recipients.empty()) return false;
     *prepared = PreparedSend{};
-    if (RecordBodyFromText(text.data(), text.size(), &prepared->body) < 1) return false;
+    if (!PrepareBody(textField, ask, &prepared->body)) return false;
     prepared->recipients = ParseRecipients(recipients);
     return true;
 }

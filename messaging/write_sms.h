@@ -109,9 +109,15 @@ struct SendBox {
 };
 SendBox SendEndBox(const SendOutcome& outcome);
 
-// Everything Send does before the card: the recipients and text read, the counter, the length
-// question (ask returns true for OK), the record built and the recipients parsed. False when
-// there is nothing to send or the question was cancelled.
+// The body a send carries: the text read (its first kTextSendReadLimit characters), the
+// counter's alphabet, the length question (ask returns true for OK) and its cut, the record
+// coded. False for an empty text or a cancelled question. vqm-phone builds its body here too,
+// with an ask that always refuses.
+bool PrepareBody(const std::u16string& textField,
+                 const std::function<bool(const std::u16string& question)>& ask, SmsRecord* body);
+
+// Everything Send does before the card: the recipients read, the body (PrepareBody) and the
+// recipients parsed. False when there is nothing to send or the question was cancelled.
 struct PreparedSend {
     SmsRecord body{};
     ParsedRecipients recipients;

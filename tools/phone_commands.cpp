@@ -23,6 +23,7 @@
 #include "messaging/message_store.h"
 #include "messaging/sms_at.h"
 #include "messaging/sms_folder.h"
+#include "messaging/write_sms.h"
 #include "support/gsm.h"
 #include "support/local_socket.h"
 #include "support/settings_store.h"
@@ -493,50 +494,48 @@ Result SmsDelete(Context& context, const Command& command) {
                   box.empty() ? "Cannot delete message." : box);
 }
 
+// The Write SMS view's send: its body, its walk over the recipients and its texts; each
+// message the card took is filed on the Sent page through the transfer file, as the view does.
 Result SmsSendAll(Context& context, const Command& command) {
-    bool ucs2 = false;
+    SmsRecord body{};
     std::string error;
-    if (CheckMessageText(command.text, &ucs2, &error) != kExitDone) return Fail(kExitUsage, error);
-    std::vector<std::string> numbers;
+    if (CheckMessageText(command.text, &body, &error) != kExitDone) return Fail(kExitUsage, error);
+    ParsedRecipients recipients;
     for (const std::string& given : command.numbers) {
         std::string number = RecipientNumber(given);
         if (number.empty()) return Fail(kExitUsage, "Not a phone number: \"" + given + "\".");
-        numbers.push_back(number);
+        recipients.numbers.push_back(std::move(number));
+        ++recipients.count;
     }
-    const std::u16string text = Utf8ToUtf16(command.text);
     MessageStore store(context.settings);
     StoreGuardCreate(store);
     FolderUi ui;
     store.hooks.pasteInto = [&](int page) { PasteIntoPage(store, context.link, page, ui); };
-    if (SmsSetFormat(context.link, kSmsModePdu) != 0)
-        return Fail(kExitRefused, "Failed to send message.");
-    Result result;
     std::vector<std::string> sent;
-    for (const std::string& number : numbers) {
-        SmsRecord record{};
-        RecordBodyFromText(text.data(), text.size(), &record);
-        std::snprintf(record.number, sizeof record.number, "%s", number.c_str());
-        StampLocalTime(&record);
-        if (!SmsSend(context.link, kSmsModePdu, &record)) {
-            result.code = kExitRefused;
-            result.err = "Cannot send message to \"" + number +
-                         "\". Please check the SMSC setting or try again later.\n";
-            break;
-        }
+    SendHooks hooks;
+    hooks.sent = [&](const SmsRecord& record) {
         ClipboardCopyRecord(store, record);
-        sent.push_back(number);
-    }
+        sent.emplace_back(record.number, strnlen(record.number, sizeof record.number));
+    };
+    const SendOutcome outcome = SendToRecipients(context.link, body, recipients, hooks);
     if (!sent.empty() && context.listsChanged) context.listsChanged();
+
+    Result result;
+    const std::string said = Utf16ToUtf8(SendEndBox(outcome).text);
+    if (outcome.end == SendEnd::Sent) {
+        if (!command.json) result.out = said + "\n";
+    } else {
+        result.code = kExitRefused;
+        result.err = (said.empty() ? std::string("Failed to send message.") : said) + "\n";
+    }
     if (command.json) {
         std::vector<std::string> items;
         for (const std::string& number : sent)
             items.push_back(Json(number));
         result.out = JsonObject({{"sent", JsonArray(items)},
-                                 {"coding", Json(ucs2 ? "ucs2" : "gsm")},
+                                 {"coding", Json(body.coding == 8 ? "ucs2" : "gsm")},
                                  {"ok", result.code == kExitDone ? "true" : "false"}}) +
                      "\n";
-    } else if (result.code == kExitDone) {
-        result.out = "Message has been sent.\n";
     }
     return result;
 }
@@ -938,8 +937,8 @@ bool NeedsCard(const Command& command) {
 
 int CheckInputs(const Command& command, std::string* error) {
     if (command.verb == Verb::SmsSend && !command.textFromStdin) {
-        bool ucs2 = false;
-        return CheckMessageText(command.text, &ucs2, error);
+        SmsRecord body{};
+        return CheckMessageText(command.text, &body, error);
     }
     if (command.verb != Verb::ContactsImport) return kExitDone;
     std::error_code failure;
@@ -960,7 +959,7 @@ int CheckInputs(const Command& command, std::string* error) {
     return kExitDone;
 }
 
-int CheckMessageText(const std::string& utf8, bool* ucs2, std::string* error) {
+int CheckMessageText(const std::string& utf8, SmsRecord* body, std::string* error) {
     if (utf8.empty()) {
         *error = "The message text is empty.";
         return kExitUsage;
@@ -970,27 +969,28 @@ int CheckMessageText(const std::string& utf8, bool* ucs2, std::string* error) {
         return kExitUsage;
     }
     const std::u16string text = Utf8ToUtf16(utf8);
-    *ucs2 = !CanUseGsmAlphabet(text.data(), text.size() * sizeof(char16_t));
-    const int limit = *ucs2 ? kMaxUcs2Chars : kMaxGsmChars;
-    if (static_cast<int>(text.size()) > limit) {
-        *error = "Short message length exceeded: " + std::to_string(text.size()) +
-                 " characters, at most " + std::to_string(limit) + " go in one message" +
-                 (*ucs2 ? " with characters outside the GSM alphabet." : ".");
-        return kExitUsage;
+    bool asked = false;
+    const auto refuse = [&asked](const std::u16string&) {
+        asked = true;
+        return false;
+    };
+    if (PrepareBody(text, refuse, body)) return kExitDone;
+    if (asked) {
+        const MessageCount count = CountMessage(text);
+        const size_t length = std::max(static_cast<size_t>(count.count), text.size());
+        *error = "Short message length exceeded: " + std::to_string(length) +
+                 " characters, at most " + std::to_string(count.limit) + " go in one message" +
+                 (count.coding == kCodingUcs2 ? " with characters outside the GSM alphabet." : ".");
+    } else {
+        *error = "The message text cannot be sent as a short message.";
     }
-    return kExitDone;
+    return kExitUsage;
 }
 
 std::string RecipientNumber(const std::string& text) {
     const std::u16string wide = Utf8ToUtf16(text);
     if (wide.empty() || !IsValidPhoneNumber(wide.c_str())) return "";
-    std::string number;
-    for (char16_t c : wide) {
-        if (c == '+' || c == '(')
-            number += '+';
-        else if ((c >= '0' && c <= '9') || c == '*' || c == '#')
-            number += static_cast<char>(c);
-    }
+    std::string number = FilterNumber(wide);
     return number.size() < sizeof(SmsRecord::number) ? number : "";
 }
 

@@ -16,6 +16,7 @@
 
 namespace vqm {
 struct Link;
+struct SmsRecord;
 class SettingsStore;
 struct CallLog;
 struct PhonebookCaches;
@@ -29,11 +30,9 @@ inline constexpr int kExitUsage = 2;    // the command line or its input is wron
 inline constexpr int kExitNoCard = 3;   // no card to talk to
 
 // The longest message text a command takes in (anything longer is refused before it is read
-// further, so a 10 MB stdin costs nothing); the sendable limits are checked after coding.
+// further, so a 10 MB stdin costs nothing); what one message holds is the Write SMS view's
+// decision (messaging/write_sms.h).
 inline constexpr size_t kMaxTextBytes = 4096;
-// Single messages: 160 GSM characters, or 70 UCS2 ones.
-inline constexpr int kMaxGsmChars = 160;
-inline constexpr int kMaxUcs2Chars = 70;
 // A vCard file larger than this is refused unread.
 inline constexpr long long kMaxVCardFileBytes = 4 * 1024 * 1024;
 
@@ -92,10 +91,12 @@ struct Result {
 };
 
 // The checks of a message text that need no card: kExitDone, or kExitUsage with the reason.
-// *ucs2 tells how it will travel (as the Write SMS view decides).
-int CheckMessageText(const std::string& utf8, bool* ucs2, std::string* error);
-// The number a recipient gives, filtered as the Write SMS view does ('+' and '(' give '+';
-// digits, '*' and '#' stay; everything else goes); empty when IsValidPhoneNumber refuses it.
+// *body gets the message as the Write SMS view builds it (PrepareBody), its coding 0 for
+// 7-bit or 8 for UCS2; a text the view would offer to cut is refused instead, as a script
+// cannot be asked.
+int CheckMessageText(const std::string& utf8, SmsRecord* body, std::string* error);
+// The number a recipient gives, through the Write SMS view's filter (FilterNumber); empty when
+// IsValidPhoneNumber refuses it or a message could not hold it whole.
 std::string RecipientNumber(const std::string& text);
 
 // What a command runs on. callLog and caches may be null (the program makes its own).

@@ -9,7 +9,9 @@
 
 #include "link/link.h"
 #include "messaging/message_store.h"
+#include "messaging/write_sms.h"
 #include "support/settings_store.h"
+#include "support/text.h"
 #include "tests/common/temp_folder.h"
 
 namespace vqm::phone {
@@ -141,34 +143,48 @@ TEST_F(PhoneCommandsTest, RequestAndReplyLinesCarryAnyTextAndRefuseDamage) {
         EXPECT_FALSE(DecodeReply(bad, &result)) << bad;
 }
 
-TEST_F(PhoneCommandsTest, MessageTextsAreCheckedAsTheWriteViewCodesThem) {
+TEST_F(PhoneCommandsTest, MessageTextsAreCheckedAndCodedAsTheWriteViewSendsThem) {
     struct TextCase {
         std::string text;
         int code;
-        bool ucs2;
+        int coding;  // 0 7-bit, 8 UCS2
     };
     const std::vector<TextCase> cases = {
-        {"Hello", kExitDone, false},
-        {std::string(160, 'a'), kExitDone, false},
-        {std::string(161, 'a'), kExitUsage, false},
-        {"Grüße", kExitDone, false},               // ü and ß are in the GSM alphabet
-        {"price 5\xE2\x82\xAC", kExitDone, true},  // the euro sign needs UCS2 here
-        {"\xE6\x97\xA5" + std::string(69, 'a'), kExitDone, true},  // 70 units
-        {"\xE6\x97\xA5" + std::string(70, 'a'), kExitUsage, true},
-        {"", kExitUsage, false},
-        {std::string(kMaxTextBytes + 1, 'a'), kExitUsage, false},
+        {"Hello", kExitDone, 0},
+        {std::string(160, 'a'), kExitDone, 0},
+        {std::string(161, 'a'), kExitUsage, 0},
+        {"Grüße", kExitDone, 0},                                // ü and ß are in the GSM alphabet
+        {"price 5\xE2\x82\xAC", kExitDone, 8},                  // the euro sign needs UCS2 here
+        {"\xE6\x97\xA5" + std::string(69, 'a'), kExitDone, 8},  // 70 units
+        {"\xE6\x97\xA5" + std::string(70, 'a'), kExitUsage, 8},
+        {"two\r\nlines", kExitDone, 0},
+        {std::string(159, 'a') + "\r\n", kExitUsage, 0},  // the view would offer to cut it
+        {"", kExitUsage, 0},
+        {std::string(kMaxTextBytes + 1, 'a'), kExitUsage, 0},
     };
     for (const TextCase& c : cases) {
-        bool ucs2 = !c.ucs2;
+        SCOPED_TRACE(c.text.substr(0, 20));
+        SmsRecord body{};
         std::string error;
-        EXPECT_EQ(CheckMessageText(c.text, &ucs2, &error), c.code) << c.text.substr(0, 20);
-        if (!c.text.empty() && c.text.size() <= kMaxTextBytes) {
-            EXPECT_EQ(ucs2, c.ucs2) << c.text.substr(0, 20);
-        }
+        ASSERT_EQ(CheckMessageText(c.text, &body, &error), c.code);
         if (c.code != kExitDone) {
             EXPECT_FALSE(error.empty());
+            continue;
         }
+        EXPECT_EQ(body.coding, c.coding);
+        // What vqm-phone sends is what the Write SMS view sends for the same text.
+        PreparedSend view;
+        ASSERT_TRUE(PrepareSend(u"12345", Utf8ToUtf16(c.text), {}, &view));
+        EXPECT_EQ(body.coding, view.body.coding);
+        EXPECT_EQ(body.length, view.body.length);
+        EXPECT_EQ(std::string(body.text, sizeof body.text),
+                  std::string(view.body.text, sizeof view.body.text));
     }
+    // Refused texts name their limit.
+    std::string error;
+    SmsRecord body{};
+    CheckMessageText("\xE6\x97\xA5" + std::string(70, 'a'), &body, &error);
+    EXPECT_NE(error.find("71 characters, at most 70"), std::string::npos) << error;
 }
 
 TEST_F(PhoneCommandsTest, RecipientNumbersAreFilteredAsTheWriteViewDoes) {
