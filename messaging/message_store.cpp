@@ -43,12 +43,12 @@ void Call(const std::function<void()>& hook) {
     if (hook) hook();
 }
 
-// An append after a torn record would shift every later record off the 704-byte grid.
-void DropPartialTail(const std::string& path) {
+// An append after a torn record would shift every later record off the record grid.
+void DropPartialTail(const std::string& path, size_t recordSize) {
     std::error_code error;
     const auto size = std::filesystem::file_size(path, error);
     if (error) return;
-    const auto whole = size - size % kSmsRecordSize;
+    const auto whole = size - size % recordSize;
     if (whole != size) std::filesystem::resize_file(path, whole, error);
 }
 
@@ -204,7 +204,7 @@ FILE* OpenClaimed(MessageStore& store, int folder, int access, bool* claimed) {
     if (!StoreGuardAcquire(store, access)) return nullptr;
     *claimed = true;
     const std::string path = StoreFolderPath(store, folder);
-    if (access == kAccessWrite) DropPartialTail(path);
+    if (access == kAccessWrite) DropPartialTail(path, kSmsRecordSize);
     return std::fopen(path.c_str(), access == kAccessRead ? "rb" : "ab");
 }
 
@@ -451,6 +451,8 @@ void SmsIntakeFile(MessageStore& store) {
 }
 
 int ClipboardAppend(MessageStore& store, const SmsRecord& record) {
+    // A kill in the middle of an earlier append can leave part of an entry at the end.
+    DropPartialTail(ClipboardPath(store), kClipboardEntrySize);
     FILE* file = std::fopen(ClipboardPath(store).c_str(), "ab");
     if (!file) return 0;
     ClipboardEntry entry{};

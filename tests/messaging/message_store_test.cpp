@@ -309,6 +309,29 @@ TEST_F(MessageStoreTest, TransferFileEntriesAndWhereTheyArePasted) {
     EXPECT_EQ(ClipboardCount(store_), 0);
 }
 
+// A kill in the middle of an append's write can leave the start of an entry behind (the crash
+// soak saw it stop at a page boundary); the next entry must start on the 712-byte grid again.
+TEST_F(MessageStoreTest, TransferEntryCutShortIsIgnoredAndDroppedByTheNextAppend) {
+    for (size_t cut : {size_t{1}, kClipboardHeaderSize, size_t{300}, kClipboardEntrySize - 1}) {
+        SCOPED_TRACE("cut after " + std::to_string(cut) + " bytes");
+        ClipboardRemove(store_);
+        ASSERT_EQ(ClipboardAppend(store_, Record(1, "REC READ", "first")), 1);
+        ASSERT_EQ(ClipboardAppend(store_, Record(2, "REC READ", "second")), 1);
+        const std::string whole = FileBytes(ClipboardPath(store_));
+        WriteBytes(ClipboardPath(store_), whole + whole.substr(0, cut));
+        EXPECT_EQ(ClipboardCount(store_), 2);
+        EXPECT_EQ(ClipboardRead(store_).size(), 2u);
+
+        ASSERT_EQ(ClipboardAppend(store_, Record(3, "REC READ", "third")), 1);
+        EXPECT_EQ(fs::file_size(ClipboardPath(store_)), 3 * kClipboardEntrySize);
+        const std::vector<ClipboardEntry> entries = ClipboardRead(store_);
+        ASSERT_EQ(entries.size(), 3u);
+        EXPECT_EQ(entries[2].cut, 0);
+        EXPECT_EQ(entries[2].record.index, 3);
+        EXPECT_STREQ(entries[2].record.text, "third");
+    }
+}
+
 TEST_F(MessageStoreTest, ImportTakesThePcFileInOnceAndRenamesIt) {
     auto pc = [](const char* folder, const char* number, const char* date, const char* text) {
         PcMessage m{};
