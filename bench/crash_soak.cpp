@@ -7,13 +7,17 @@
 // file itself: every record reported written must be there and whole, every record reported
 // deleted gone; an operation under way at the kill may have left the file as before it or as
 // after it (or at one of its own steps, for the operations that are several steps by design).
-// A file that is not whole records, a record that is not what a writer wrote, or an SQLite file
-// that fails its integrity check is torn. The next child carries on from what the last one left.
+// A record that is not what a writer wrote, bytes after the last whole record that are not the
+// start of the record being appended at the kill, or an SQLite file that fails its integrity
+// check make the file torn. The next child carries on from what the last one left; after an
+// append cut short, it appends first and is killed as soon as that append returned, so that a
+// writer that appends behind the cut bytes shows up as torn and lost.
 //
 //   vqm-crash-soak [--kills N] [--kind FILE] [--seed S]
 //
-// Prints "kind kills lost torn" per kind, with the operations done and the kills that landed
-// inside one, and a total. Exits 0 only when nothing was lost or torn.
+// Prints per kind the kills, the kills after which records were lost or the file torn, the
+// appends cut short by a kill, the operations done and the kills that landed inside one, and a
+// total. Exits 0 only when nothing was lost or torn.
 #include <poll.h>
 #include <signal.h>
 #include <sqlite3.h>
@@ -32,6 +36,7 @@
 #include <random>
 #include <sstream>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "calls/call_log.h"
@@ -48,7 +53,8 @@ namespace {
 using namespace vqm;
 namespace fs = std::filesystem;
 
-constexpr int kKeys = 40;  // keys a writer uses, so that files stay a few dozen records long
+// Keys a writer uses: enough that the files of small records grow past a page or two.
+constexpr int kKeys = 120;
 constexpr int kVersions = 10000;
 constexpr int kCallLogLimit = 12;                // small, so that appends drop the oldest too
 constexpr int kMaxDelayUs = 30000;               // a kill comes 0 to 30 ms after the fork
@@ -78,19 +84,26 @@ struct Report {
 // What the parent found in a file after a kill.
 struct Snapshot {
     State records;
-    std::string torn;  // why the file is not whole; empty when it is
+    std::string torn;  // why the file is damaged; empty when it is not
+    std::string tail;  // bytes after the last whole record of a flat file
 };
 
 using Writer = std::function<bool(const Op&)>;
-// A record's key and version when its bytes are exactly what a writer wrote.
-using Parse = std::function<std::optional<Rec>(const char* bytes)>;
+
+// A flat file of fixed-size records: what a record's bytes are, where its key and version are
+// read from, and how many of its leading bytes the writer decides (the program fills the rest).
+struct Layout {
+    size_t size = 0;
+    std::function<std::string(int key, int version)> bytes;
+    std::function<std::optional<Rec>(const char* record)> keyOf;
+    size_t decided = 0;  // 0: every byte
+};
 
 struct Kind {
     std::string name;                         // the file's name in the install folder
     std::vector<std::pair<OpType, int>> mix;  // operations and their weights
-    std::function<Writer(const std::string& folder)> writer;  // made in the child
-    size_t recordSize = 0;  // a flat file of records, read with parse ...
-    Parse parse = {};
+    std::function<Writer(const std::string& folder)> writer;       // made in the child
+    Layout flat = {};                                              // a flat file of records ...
     std::function<Snapshot(const std::string& folder)> read = {};  // ... or a file of its own
     int versions = kVersions;
     bool ordered = true;  // records keep their order in the file
@@ -99,7 +112,7 @@ struct Kind {
     std::function<bool(OpType, int key)> allows = {};  // which keys an operation may pick
 };
 
-// ---- Record contents: a record's key and version decide all of its bytes. ----
+// ---- Record contents: a record's key and version decide its bytes. ----
 
 std::string Tag(int key, int version) {
     return "K" + std::to_string(key) + "V" + std::to_string(version);
@@ -110,6 +123,10 @@ std::optional<Rec> ParseTag(const char* text, size_t width) {
     if (strnlen(text, width) == width || std::sscanf(text, "K%dV%d", &rec.key, &rec.version) != 2)
         return std::nullopt;
     return rec;
+}
+
+std::function<std::optional<Rec>(const char*)> TagAt(size_t offset, size_t width) {
+    return [offset, width](const char* record) { return ParseTag(record + offset, width); };
 }
 
 std::string Digits(int key, int version) {
@@ -130,8 +147,8 @@ void Put(char (&field)[N], const std::string& text) {
 }
 
 template <typename T>
-std::optional<Rec> SameAs(const char* bytes, const T& want, std::optional<Rec> rec) {
-    return std::memcmp(bytes, &want, sizeof want) == 0 ? rec : std::nullopt;
+std::string Bytes(const T& value) {
+    return std::string(reinterpret_cast<const char*>(&value), sizeof value);
 }
 
 std::tm CallTime() {
@@ -141,15 +158,12 @@ std::tm CallTime() {
     return time;
 }
 
-std::optional<Rec> ParseCallLog(const char* bytes) {
-    CallLogRecord record, want{};
-    std::memcpy(&record, bytes, sizeof record);
-    const auto rec = ParseTag(record.number, sizeof record.number);
-    if (!rec || record.sequence <= 0) return std::nullopt;
-    Put(want.number, Tag(rec->key, rec->version));
-    Put(want.time, kTime);
-    want.sequence = record.sequence;
-    return SameAs(bytes, want, rec);
+// The sequence number at the end is the program's choice.
+std::string CallLogBytes(int key, int version) {
+    CallLogRecord record{};
+    Put(record.number, Tag(key, version));
+    Put(record.time, kTime);
+    return Bytes(record);
 }
 
 std::string EventText(int key, int version) {
@@ -160,19 +174,16 @@ std::string EventText(int key, int version) {
 const auto kEventWhen = std::chrono::system_clock::from_time_t(1000000000);
 constexpr uint16_t kEventWhenFields[8] = {2001, 9, 0, 9, 1, 46, 40, 0};
 
-std::optional<Rec> ParseEvent(const char* bytes) {
-    const auto rec = ParseTag(bytes + 18, 256);
-    if (!rec) return rec;
-    const std::string text = EventText(rec->key, rec->version);
-    char want[kEventRecordSize] = {};
+std::string EventBytes(int key, int version) {
+    const std::string text = EventText(key, version);
+    std::string bytes(kEventRecordSize, '\0');
     for (int i = 0; i < 8; ++i) {
-        want[2 * i] = static_cast<char>(kEventWhenFields[i] & 0xFF);
-        want[2 * i + 1] = static_cast<char>(kEventWhenFields[i] >> 8);
+        bytes[2 * i] = static_cast<char>(kEventWhenFields[i] & 0xFF);
+        bytes[2 * i + 1] = static_cast<char>(kEventWhenFields[i] >> 8);
     }
-    want[16] = static_cast<char>(rec->key % 3);
-    want[17] = static_cast<char>(text.size());
-    std::memcpy(want + 18, text.data(), text.size());
-    return SameAs(bytes, want, rec);
+    bytes[16] = static_cast<char>(key % 3);
+    bytes[17] = static_cast<char>(text.size());
+    return bytes.replace(18, text.size(), text);
 }
 
 // A rewrite changes only the status, so the version lives there.
@@ -188,21 +199,14 @@ SmsRecord Sms(int key, int version) {
     return record;
 }
 
-std::optional<Rec> ParseSms(const char* bytes) {
+std::optional<Rec> SmsKey(const char* bytes) {
     SmsRecord record;
     std::memcpy(&record, bytes, sizeof record);
     int version = -1;
     if (strnlen(record.status, sizeof record.status) == sizeof record.status ||
         std::sscanf(record.status, "V%d", &version) != 1)
         return std::nullopt;
-    return SameAs(bytes, Sms(record.index, version), Rec{record.index, version});
-}
-
-// A transfer entry: two header words, always 0 as written, then the record.
-std::optional<Rec> ParseTransfer(const char* bytes) {
-    const char header[kClipboardHeaderSize] = {};
-    if (std::memcmp(bytes, header, sizeof header) != 0) return std::nullopt;
-    return ParseSms(bytes + kClipboardHeaderSize);
+    return Rec{record.index, version};
 }
 
 PhonebookEntry Entry(int key, int version) {
@@ -215,14 +219,6 @@ PhonebookEntry Entry(int key, int version) {
     entry.numberLength = static_cast<int32_t>(number.size());
     entry.textLength = static_cast<int32_t>(text.size());
     return entry;
-}
-
-std::optional<Rec> ParseEntry(const char* bytes) {
-    PhonebookEntry entry;
-    std::memcpy(&entry, bytes, sizeof entry);
-    const auto rec = ParseTag(entry.text, sizeof entry.text);
-    if (!rec || rec->key != entry.index) return std::nullopt;
-    return SameAs(bytes, Entry(rec->key, rec->version), rec);
 }
 
 // A contact with one number of one sort only, so that it lands in phonebk<file>.db alone.
@@ -238,21 +234,24 @@ AddressBookContact Contact(int file, int key, int version) {
 }
 
 // Its record there: the name, then the number (the first of three in the home and work files).
-Parse ParseOutlook(size_t size) {
-    return [size](const char* bytes) -> std::optional<Rec> {
-        const auto rec = ParseTag(bytes, kOutlookNameSize);
-        if (!rec) return rec;
-        std::string want(size, '\0');
-        const std::string tag = Tag(rec->key, rec->version),
-                          number = Digits(rec->key, rec->version);
-        want.replace(0, tag.size(), tag);
-        want.replace(kOutlookNameSize, number.size(), number);
-        return want == std::string(bytes, size) ? rec : std::nullopt;
-    };
+Layout OutlookLayout(int file) {
+    const size_t size = file == 1 ? kOutlookMobileRecordSize : kOutlookNumbersRecordSize;
+    return {size,
+            [size](int key, int version) {
+                const std::string tag = Tag(key, version), number = Digits(key, version);
+                std::string bytes(size, '\0');
+                return bytes.replace(0, tag.size(), tag)
+                    .replace(kOutlookNameSize, number.size(), number);
+            },
+            TagAt(0, kOutlookNameSize)};
 }
 
 std::string SettingText(int key, int version) {
     return Tag(key, version) + ":" + Filler(key, 40 + (key * 31 + version * 17) % 900);
+}
+
+std::string CardNumber(int key) {
+    return "77" + std::to_string(1000 + key);
 }
 
 // ---- Reading the files back, independently of the program's own readers. ----
@@ -266,25 +265,28 @@ bool ReadAll(const std::string& path, std::string* bytes) {
     return true;
 }
 
-// A flat file of fixed-size records; a missing file holds none.
-Snapshot ReadFlat(const std::string& path, size_t size, const Parse& parse) {
+// A missing file holds no records.
+Snapshot ReadFlat(const std::string& path, const Layout& layout) {
     Snapshot snap;
     std::string bytes;
     if (!ReadAll(path, &bytes)) return snap;
-    if (bytes.size() % size != 0)
-        snap.torn =
-            std::to_string(bytes.size()) + " bytes, not whole records of " + std::to_string(size);
-    for (size_t at = 0; at + size <= bytes.size(); at += size) {
-        if (const auto rec = parse(bytes.data() + at))
+    const size_t whole = bytes.size() - bytes.size() % layout.size;
+    const size_t decided = layout.decided ? layout.decided : layout.size;
+    snap.tail = bytes.substr(whole);
+    for (size_t at = 0; at < whole; at += layout.size) {
+        const auto rec = layout.keyOf(bytes.data() + at);
+        if (rec &&
+            layout.bytes(rec->key, rec->version).compare(0, decided, bytes, at, decided) == 0)
             snap.records.push_back(*rec);
         else
-            snap.torn = "record " + std::to_string(at / size + 1) + " is not what was written";
+            snap.torn = "record " + std::to_string(at / layout.size + 1) + " is not as written";
     }
     return snap;
 }
 
-// Named values "Soak<key>" (keys 1 to 20; odd ones integers key * 100000 + version, even ones
-// texts) and the entries of the "NewIdx" list (keys 21 to 40, each key * 10000 + version).
+// Named values "Soak<key>" (the lower half of the keys; odd ones integers key * 100000 +
+// version, even ones texts) and the entries of the "NewIdx" list (the upper half, each entry
+// key * 10000 + version).
 Snapshot ReadSettings(const std::string& folder) {
     Snapshot snap;
     sqlite3* db = nullptr;
@@ -319,7 +321,7 @@ Snapshot ReadSettings(const std::string& folder) {
                      value == SettingText(key, rec->version))
                 snap.records.push_back(*rec);
             else
-                snap.torn = "the value of " + name + " is not what was written";
+                snap.torn = "the value of " + name + " is not as written";
         } else if (name == "NewIdx") {
             for (size_t at = 0, used = 0; at < value.size(); at += used) {
                 int location = 0, n = 0;
@@ -335,10 +337,6 @@ Snapshot ReadSettings(const std::string& folder) {
     sqlite3_finalize(st);
     sqlite3_close(db);
     return snap;
-}
-
-std::string CardNumber(int key) {
-    return "77" + std::to_string(1000 + key);
 }
 
 // The simulated card's kept state: the busy (version 0) and unanswered (1) numbers are the
@@ -441,22 +439,19 @@ Writer SimCacheWriter(int file, const std::string& folder) {
     };
 }
 
-// An append is a build from an address book of one contact; the builder only ever appends.
+// The address-book cache is only ever rebuilt from the whole address book, or cleared.
 Writer OutlookWriter(int file, const std::string& folder) {
     auto* caches = new PhonebookCaches(OpenSettings(folder));
     caches->pause = [](int) {};
     return [file, caches](const Op& op) {
         AddressBookResult book;
         book.opened = true;
-        for (int i = 0; i < std::max(op.count, 1); ++i)
+        for (int i = 0; i < op.count; ++i)
             book.contacts.push_back(Contact(file, op.key + i, op.version));
-        const auto read = [book] { return book; };
-        if (op.type == OpType::Append)
-            OutlookCacheBuild(*caches, read, {}, {});
-        else if (op.type == OpType::Clear)
+        if (op.type == OpType::Clear)
             OutlookCacheClear(*caches, {});
         else
-            OutlookCacheRebuild(*caches, read, {}, {});
+            OutlookCacheRebuild(*caches, [book] { return book; }, {}, {});
         caches->workers.JoinAll();
         return true;
     };
@@ -480,7 +475,8 @@ Writer CardWriter(const std::string& folder) {
 
 std::vector<Kind> Kinds() {
     using enum OpType;
-    const std::vector<std::pair<OpType, int>> edits = {{Append, 2}, {Delete, 1}, {Rewrite, 1}};
+    // As many deletes as appends: the files wander between empty and full.
+    const std::vector<std::pair<OpType, int>> edits = {{Append, 1}, {Delete, 1}, {Rewrite, 1}};
     std::vector<Kind> kinds;
     kinds.push_back({.name = "settings.db",
                      .mix = {{Append, 3}, {Rewrite, 2}, {Delete, 2}},
@@ -495,8 +491,8 @@ std::vector<Kind> Kinds() {
         kinds.push_back({.name = "callog" + std::to_string(n) + ".db",
                          .mix = {{Append, 3}, {Delete, 1}},
                          .writer = std::bind_front(CallLogWriter, n),
-                         .recordSize = kCallLogRecordSize,
-                         .parse = ParseCallLog,
+                         .flat = {kCallLogRecordSize, CallLogBytes, TagAt(0, kCallLogNumberSize),
+                                  offsetof(CallLogRecord, sequence)},
                          .limit = kCallLogLimit,
                          .setup = [n](const std::string&, SettingsStore& settings) {
                              const std::u16string name =
@@ -506,33 +502,36 @@ std::vector<Kind> Kinds() {
     kinds.push_back({.name = "event.log",
                      .mix = {{Append, 1}, {Pop, 1}},
                      .writer = EventLogWriter,
-                     .recordSize = kEventRecordSize,
-                     .parse = ParseEvent});
+                     .flat = {kEventRecordSize, EventBytes, TagAt(18, 256)}});
     for (int n : {kFolderSim, kFolderLocal})
-        kinds.push_back({.name = "smsmsg" + std::to_string(n) + ".db",
-                         .mix = edits,
-                         .writer = std::bind_front(MessageFolderWriter, n),
-                         .recordSize = kSmsRecordSize,
-                         .parse = ParseSms});
-    kinds.push_back({.name = "sm_clipbd.txt",
-                     .mix = {{Append, 6}, {Clear, 1}},
-                     .writer = TransferWriter,
-                     .recordSize = kClipboardEntrySize,
-                     .parse = ParseTransfer});
+        kinds.push_back(
+            {.name = "smsmsg" + std::to_string(n) + ".db",
+             .mix = edits,
+             .writer = std::bind_front(MessageFolderWriter, n),
+             .flat = {kSmsRecordSize, [](int key, int version) { return Bytes(Sms(key, version)); },
+                      SmsKey}});
+    // A transfer entry: two header words, always 0 as written, then the record.
+    kinds.push_back(
+        {.name = "sm_clipbd.txt",
+         .mix = {{Append, 20}, {Clear, 1}},
+         .writer = TransferWriter,
+         .flat = {kClipboardEntrySize,
+                  [](int key, int version) {
+                      return std::string(kClipboardHeaderSize, '\0') + Bytes(Sms(key, version));
+                  },
+                  [](const char* entry) { return SmsKey(entry + kClipboardHeaderSize); }}});
     for (int n = 1; n <= 2; ++n)
         kinds.push_back({.name = "simphonebk" + std::to_string(n) + ".db",
                          .mix = edits,
                          .writer = std::bind_front(SimCacheWriter, n),
-                         .recordSize = kPhonebookEntrySize,
-                         .parse = ParseEntry});
-    for (int n = 1; n <= 3; ++n) {
-        const size_t size = n == 1 ? kOutlookMobileRecordSize : kOutlookNumbersRecordSize;
+                         .flat = {kPhonebookEntrySize,
+                                  [](int key, int version) { return Bytes(Entry(key, version)); },
+                                  TagAt(offsetof(PhonebookEntry, text), kPhonebookTextSize)}});
+    for (int n = 1; n <= 3; ++n)
         kinds.push_back({.name = "phonebk" + std::to_string(n) + ".db",
-                         .mix = {{Append, 6}, {Clear, 1}, {Rebuild, 1}},
+                         .mix = {{Rebuild, 6}, {Clear, 1}},
                          .writer = std::bind_front(OutlookWriter, n),
-                         .recordSize = size,
-                         .parse = ParseOutlook(size)});
-    }
+                         .flat = OutlookLayout(n)});
     kinds.push_back({.name = "card.state",
                      .mix = edits,
                      .writer = CardWriter,
@@ -588,13 +587,26 @@ std::vector<State> Steps(const Kind& kind, State state, const Op& op) {
     return {state};
 }
 
-Op Choose(const Kind& kind, const State& state, std::mt19937& rng) {
+// The records an operation appends, in order.
+State Appended(const Op& op) {
+    State records;
+    if (op.type == OpType::Append) records.push_back({op.key, op.version});
+    for (int i = 0; op.type == OpType::Rebuild && i < op.count; ++i)
+        records.push_back({op.key + i, op.version});
+    return records;
+}
+
+// append asks for an append first, where the kind has them.
+Op Choose(const Kind& kind, const State& state, std::mt19937& rng, bool append) {
     const auto uniform = [&rng](int low, int high) {
         return std::uniform_int_distribution<int>(low, high)(rng);
     };
     int total = 0;
     for (const auto& [type, weight] : kind.mix)
         total += weight;
+    std::vector<int> versions(kKeys + 1, -1);  // of the records in the file, by key
+    for (const Rec& rec : state)
+        versions[rec.key] = rec.version;
     for (;;) {
         int pick = uniform(0, total - 1);
         OpType type = kind.mix.front().first;
@@ -603,45 +615,45 @@ Op Choose(const Kind& kind, const State& state, std::mt19937& rng) {
                 type = candidate;
                 break;
             }
+        if (std::exchange(append, false) &&
+            std::any_of(kind.mix.begin(), kind.mix.end(),
+                        [](const auto& entry) { return entry.first == OpType::Append; }))
+            type = OpType::Append;
         Op op{type, 0, uniform(0, kind.versions - 1), 0};
         if (type == OpType::Pop || type == OpType::Clear) {
             if (state.empty()) continue;
             return op;
         }
         if (type == OpType::Rebuild) {
-            op.count = uniform(1, 4);
+            op.count = uniform(1, kKeys / 2);
             op.key = uniform(1, kKeys - op.count + 1);
             return op;
         }
         // An append takes a key not in the file, a delete or rewrite one that is.
         std::vector<int> keys;
-        for (int key = 1; key <= kKeys; ++key) {
-            const bool present = std::any_of(state.begin(), state.end(),
-                                             [key](const Rec& r) { return r.key == key; });
-            if (present == (type != OpType::Append) && (!kind.allows || kind.allows(type, key)))
+        for (int key = 1; key <= kKeys; ++key)
+            if ((versions[key] >= 0) == (type != OpType::Append) &&
+                (!kind.allows || kind.allows(type, key)))
                 keys.push_back(key);
-        }
         if (keys.empty()) continue;
         op.key = keys[uniform(0, static_cast<int>(keys.size()) - 1)];
         // A delete names the record as it stands (a list entry is found by its whole value).
-        for (const Rec& rec : state)
-            if (rec.key == op.key && type != OpType::Append)
-                op.version =
-                    type == OpType::Rewrite ? (rec.version + 1) % kind.versions : rec.version;
+        if (type == OpType::Delete) op.version = versions[op.key];
+        if (type == OpType::Rewrite) op.version = (versions[op.key] + 1) % kind.versions;
         return op;
     }
 }
 
 [[noreturn]] void RunWriter(const Kind& kind, const std::string& folder, State model, uint32_t seed,
-                            int pipe) {
+                            bool probe, int pipe) {
     std::mt19937 rng(seed);
     const Writer write = kind.writer(folder);
     const auto send = [pipe](char phase, const Op& op) {
         const Report report{phase, op};
         if (::write(pipe, &report, sizeof report) != sizeof report) _exit(3);
     };
-    for (;;) {
-        const Op op = Choose(kind, model, rng);
+    for (bool first = true;; first = false) {
+        const Op op = Choose(kind, model, rng, first && probe);
         send('B', op);
         if (!write(op)) {
             send('F', op);
@@ -652,26 +664,35 @@ Op Choose(const Kind& kind, const State& state, std::mt19937& rng) {
     }
 }
 
-// Forks the writer, lets it run for delayUs, kills it and collects its reports. failed is set
-// when the writer ended any other way than by the kill.
+// Forks the writer, lets it run for delayUs, kills it and collects its reports. A probe is
+// killed once its first operation (an append) ended instead. failed is set when the writer
+// ended any other way than by the kill.
 std::vector<Report> RunAndKill(const Kind& kind, const std::string& folder, const State& model,
-                               uint32_t seed, int delayUs, bool* failed) {
+                               uint32_t seed, int delayUs, bool probe, bool* failed) {
     int fds[2];
     if (pipe(fds) != 0) return {};
     std::fflush(nullptr);
     const pid_t pid = fork();
     if (pid == 0) {
         close(fds[0]);
-        RunWriter(kind, folder, model, seed, fds[1]);
+        RunWriter(kind, folder, model, seed, probe, fds[1]);
     }
     close(fds[1]);
     std::string bytes;
     char buffer[4096];
     // Drained while the writer runs, so that a full pipe never holds it still.
-    const auto deadline = std::chrono::steady_clock::now() + std::chrono::microseconds(delayUs);
-    for (auto now = std::chrono::steady_clock::now(); now < deadline;
+    const auto deadline =
+        std::chrono::steady_clock::now() + std::chrono::microseconds(probe ? 2000000 : delayUs);
+    const auto ended = [&bytes] {
+        for (size_t at = 0; at + sizeof(Report) <= bytes.size(); at += sizeof(Report))
+            if (bytes[at] == 'E') return true;
+        return false;
+    };
+    for (auto now = std::chrono::steady_clock::now(); now < deadline && !(probe && ended());
          now = std::chrono::steady_clock::now()) {
-        const timespec wait{0, static_cast<long>((deadline - now) / std::chrono::nanoseconds(1))};
+        const long long left = (deadline - now) / std::chrono::nanoseconds(1);
+        const timespec wait{static_cast<time_t>(left / 1000000000),
+                            static_cast<long>(left % 1000000000)};
         pollfd p{fds[0], POLLIN, 0};
         if (ppoll(&p, 1, &wait, nullptr) <= 0) continue;
         const ssize_t n = read(fds[0], buffer, sizeof buffer);
@@ -700,7 +721,7 @@ std::string Show(const State& state) {
 }
 
 struct Tally {
-    int kills = 0, lost = 0, torn = 0, ops = 0, midOp = 0, failed = 0;
+    int kills = 0, lost = 0, torn = 0, cut = 0, ops = 0, midOp = 0, failed = 0;
 };
 
 Tally Soak(const Kind& kind, const std::string& folder, int kills, std::mt19937& rng) {
@@ -710,22 +731,23 @@ Tally Soak(const Kind& kind, const std::string& folder, int kills, std::mt19937&
         SetSettingString(settings, u"InstallPath", Utf8ToUtf16(folder + "/").c_str());
         if (kind.setup) kind.setup(folder, settings);
     }
-    const auto read = [&] {
-        return kind.read ? kind.read(folder)
-                         : ReadFlat(folder + "/" + kind.name, kind.recordSize, kind.parse);
-    };
     const auto sorted = [&kind](State state) {
         if (!kind.ordered) std::sort(state.begin(), state.end());
         return state;
     };
     Tally tally;
     State committed;
-    for (int k = 1; k <= kills; ++k) {
+    std::string lastTail;
+    // The writer after a cut record is a probe: not one of the random kills.
+    for (bool probe = false; tally.kills < kills;) {
         const uint32_t seed = rng();
         const int delayUs = std::uniform_int_distribution<int>(0, kMaxDelayUs)(rng);
+        const std::string at = (probe ? "the append after kill " : "kill ") +
+                               std::to_string(tally.kills + (probe ? 0 : 1));
         std::optional<Op> inFlight;
         bool failed = false;
-        for (const Report& report : RunAndKill(kind, folder, committed, seed, delayUs, &failed)) {
+        for (const Report& report :
+             RunAndKill(kind, folder, committed, seed, delayUs, probe, &failed)) {
             if (report.phase == 'B') inFlight = report.op;
             if (report.phase == 'E') {
                 committed = Steps(kind, committed, report.op).back();
@@ -737,30 +759,51 @@ Tally Soak(const Kind& kind, const std::string& folder, int kills, std::mt19937&
                              kOpNames[static_cast<int>(report.op.type)],
                              Tag(report.op.key, report.op.version).c_str());
         }
-        ++tally.kills;
         if (failed) {
             ++tally.failed;
-            std::fprintf(stderr, "%s, kill %d: the writer ended before the kill\n",
-                         kind.name.c_str(), k);
+            std::fprintf(stderr, "%s, %s: the writer ended before the kill\n", kind.name.c_str(),
+                         at.c_str());
         }
         std::vector<State> allowed{committed};
         if (inFlight) {
-            ++tally.midOp;
+            tally.midOp += probe ? 0 : 1;
             for (State& step : Steps(kind, committed, *inFlight))
                 allowed.push_back(std::move(step));
         }
-        const Snapshot found = read();
+        tally.kills += probe ? 0 : 1;
+        probe = false;
+        Snapshot found =
+            kind.read ? kind.read(folder) : ReadFlat(folder + "/" + kind.name, kind.flat);
+        // A kill inside an append's write can stop it at a page boundary (Linux ends a write
+        // to a file there for a killed process): the start of the record being appended, which
+        // the program reads past and drops before its next write, is not damage. Left alone
+        // by the next writer, it stays as it was.
+        if (!found.tail.empty() && found.tail != lastTail) {
+            const size_t size = kind.flat.decided ? kind.flat.decided : kind.flat.size;
+            const size_t decided = std::min(found.tail.size(), size);
+            const State appended = inFlight ? Appended(*inFlight) : State{};
+            probe = std::any_of(appended.begin(), appended.end(), [&](const Rec& rec) {
+                return kind.flat.bytes(rec.key, rec.version)
+                           .compare(0, decided, found.tail, 0, decided) == 0;
+            });
+            if (probe)
+                ++tally.cut;
+            else
+                found.torn =
+                    std::to_string(found.tail.size()) + " bytes after the last whole record";
+        }
+        lastTail = found.tail;
         if (!found.torn.empty()) {
             ++tally.torn;
-            std::fprintf(stderr, "%s, kill %d: torn: %s\n", kind.name.c_str(), k,
+            std::fprintf(stderr, "%s, %s: torn: %s\n", kind.name.c_str(), at.c_str(),
                          found.torn.c_str());
         }
         if (std::none_of(allowed.begin(), allowed.end(), [&](const State& state) {
                 return sorted(state) == sorted(found.records);
             })) {
             ++tally.lost;
-            std::fprintf(stderr, "%s, kill %d: expected%s%s%s\n  found%s\n", kind.name.c_str(), k,
-                         Show(committed).c_str(), inFlight ? " or, during the " : "",
+            std::fprintf(stderr, "%s, %s: expected%s%s%s\n  found%s\n", kind.name.c_str(),
+                         at.c_str(), Show(committed).c_str(), inFlight ? " or, during the " : "",
                          inFlight ? kOpNames[static_cast<int>(inFlight->type)] : "",
                          Show(found.records).c_str());
         }
@@ -807,7 +850,9 @@ int main(int argc, char** argv) {
         return 1;
     }
     std::printf("seed %u, %d kills per kind, files in %s\n", seed, kills, root.c_str());
-    std::printf("%-14s %6s %5s %5s %8s %7s\n", "kind", "kills", "lost", "torn", "ops", "mid-op");
+    const char* format = "%-14s %6d %5d %5d %5d %8d %7d\n";
+    std::printf("%-14s %6s %5s %5s %5s %8s %7s\n", "kind", "kills", "lost", "torn", "cut", "ops",
+                "mid-op");
     Tally total;
     for (size_t i = 0; i < kinds.size(); ++i) {
         if (!only.empty() && only != kinds[i].name) continue;
@@ -816,14 +861,13 @@ int main(int argc, char** argv) {
         std::mt19937 rng(seeds);
         const std::string folder = root + "/" + fs::path(kinds[i].name).stem().string();
         const Tally t = Soak(kinds[i], folder, kills, rng);
-        std::printf("%-14s %6d %5d %5d %8d %7d\n", kinds[i].name.c_str(), t.kills, t.lost, t.torn,
-                    t.ops, t.midOp);
+        std::printf(format, kinds[i].name.c_str(), t.kills, t.lost, t.torn, t.cut, t.ops, t.midOp);
         std::fflush(stdout);
-        total.kills += t.kills, total.lost += t.lost, total.torn += t.torn;
+        total.kills += t.kills, total.lost += t.lost, total.torn += t.torn, total.cut += t.cut;
         total.ops += t.ops, total.midOp += t.midOp, total.failed += t.failed;
     }
-    std::printf("%-14s %6d %5d %5d %8d %7d\n", "total", total.kills, total.lost, total.torn,
-                total.ops, total.midOp);
+    std::printf(format, "total", total.kills, total.lost, total.torn, total.cut, total.ops,
+                total.midOp);
     const bool clean = total.lost == 0 && total.torn == 0 && total.failed == 0;
     std::error_code ignored;
     if (clean)
