@@ -490,10 +490,29 @@ long SmsFolderView::OnMessage(unsigned msg, long wParam, long) {
         case kMsgOutlookCacheBuilt:
             Reload();
             break;
+        case kWmCommand:
+            OnOutsideCommand(static_cast<int>(wParam & 0xFFFF));
+            break;
         default:
             break;
     }
     return 0;
+}
+
+// A control's command from outside (a script driving the dialer through its socket): a page's
+// list brings that page forward with every row selected, as Ctrl+A there does; a button of the
+// page in front is clicked. Other pages' buttons are hidden, and so not taken.
+void SmsFolderView::OnOutsideCommand(int id) {
+    const int listPage = id - kFolderListFirstId;
+    if (listPage >= 0 && listPage < kPageCount && lists_[listPage]) {
+        SelectPage(listPage);
+        lists_[listPage]->selectAll();
+        return;
+    }
+    const int page = pages_.current;
+    if (page < 0 || page >= kPageCount) return;
+    for (QPushButton* button : {replies_[page], forwards_[page], deletes_[page]})
+        if (button && ControlId(button) == id && button->isEnabled()) button->click();
 }
 
 }  // namespace vqm

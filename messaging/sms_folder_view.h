@@ -97,6 +97,7 @@ class SmsFolderView : public View {
     void StartRefresh();
     void JoinRefresh();
     void OnRefreshDone();
+    void OnOutsideCommand(int id);
     std::u16string NameOf(const char* number);
     void EnableSimButtons(bool enable);
 

@@ -379,6 +379,31 @@ TEST_F(SmsFolderViewTest, DeleteRemovesSimMessagesFromTheCardAndPdaOnesFromTheFo
     EXPECT_EQ(List(kPageInbox)->topLevelItemCount(), 2);
 }
 
+// A script through the dialer's socket: the Inbox's list id selects all its rows, its Delete
+// then deletes them from the card; a hidden page's button is not taken.
+TEST_F(SmsFolderViewTest, CommandsFromOutsideSelectAPagesRowsAndClickItsButtons) {
+    Start();
+    OpenFolder();
+    const std::vector<FolderRow> rows = folder_->Rows(kPageInbox);
+    ASSERT_GE(rows.size(), 2u);
+    folder_->SelectPage(kPagePda);
+    window_->Command(kFolderDeleteFirstId + kPageInbox);  // the Inbox is not in front
+    EXPECT_EQ(List(kPageInbox)->topLevelItemCount(), static_cast<int>(rows.size()));
+
+    window_->Command(kFolderListFirstId + kPageInbox);
+    EXPECT_EQ(List(kPageInbox)->selectedItems().size(), static_cast<int>(rows.size()));
+    window_->Command(kFolderDeleteFirstId + kPageInbox);
+    EXPECT_EQ(List(kPageInbox)->topLevelItemCount(), 0);
+    for (const SmsRecord& record : Folder(kFolderSim))  // the Outbox's stay
+        EXPECT_NE(std::string(record.status).rfind("REC", 0), 0u) << record.index;
+    for (const FolderRow& row : rows) {
+        SmsRecord gone{};
+        gone.index = row.record.index;
+        EXPECT_EQ(SmsRead(link_, kSmsModePdu, &gone), 0) << row.record.index;
+    }
+    EXPECT_TRUE(boxes_.empty());
+}
+
 TEST_F(SmsFolderViewTest, ReplyAndForwardHandTheirTextToTheWriteViewAndSendFilesTheSentCopy) {
     KnowContact(kKnownNumber, "Alice");
     Start();
