@@ -208,8 +208,14 @@ void CentrePage::EditCentre() {
 void CentrePage::DeleteCentre() {
     const int row = SelectedRow();
     if (exchange_.Busy() || row < 0 || row >= static_cast<int>(centres_.entries.size())) return;
+    // The card would go on using a centre that is no longer in the list, with nothing marked:
+    // it goes back to the SIM's own, as a tap on "Use SIM Default" does.
+    const bool wasInUse = !centres_.useSimDefault && row == centres_.chosen;
     vqm::DeleteCentre(context_.settings, row);
     Load(false);
+    if (!wasInUse) return;
+    useSim_->setChecked(true);
+    UseSimDefault(true);
 }
 
 void CentrePage::Select(int row) {
@@ -251,9 +257,11 @@ void CentrePage::UseSimDefault(bool use) {
     exchange_.Run([this] { return PushSimDefault(context_.link); },
                   [this](int ok) {
                       if (!ok) {
+                          Log(u"refused sim default");
                           useSim_->setChecked(centres_.useSimDefault);
                           return;
                       }
+                      Log(u"sim default");
                       centres_.useSimDefault = true;
                       centres_.simDefaultAbsent = false;
                       SaveUseSimDefault(context_.settings, true);

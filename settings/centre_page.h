@@ -49,6 +49,8 @@ class CentrePage : public View {
     void Load(bool pushToCard);
     void NewCentre();
     void EditCentre();
+    // Removes the selected centre; when it was the one the card uses, the card is given the
+    // SIM's own centre instead ("Use SIM Default" checked).
     void DeleteCentre();
     // Pushes row's centre to the card; only when the card takes it does the row become chosen.
     void Select(int row);

@@ -29,7 +29,7 @@ using testing::WaitFor;
 constexpr int kShowSettings = 40005, kExit = 40016;
 constexpr int kPageMessages = 1111, kPageNetwork = 1112, kPageModem = 1116;
 constexpr int kRowFirst = 1300;
-constexpr int kCentreSelect = 1104;
+constexpr int kCentreDelete = 1103, kCentreSelect = 1104;
 constexpr int kManual = 1062, kSearch = 1064, kRegister = 1065;
 constexpr int kIsdnV120 = 1053;
 
@@ -127,7 +127,7 @@ TEST_P(SettingsProgramTest, NetworkSearchAndRegisterReachTheCard) {
     EXPECT_TRUE(CardStatusHas("operator=20205"));
 }
 
-TEST_P(SettingsProgramTest, ChosenCentreReachesTheCardOnConnectAndOnSelect) {
+TEST_P(SettingsProgramTest, ChosenCentreReachesTheCardOnConnectAndOnSelectAndGoesOnDelete) {
     Start();
     ASSERT_TRUE(Shows("settings-centre chosen +306900000")) << Log();
     EXPECT_TRUE(CardKeeps("sms-centre +306900000\n")) << Read(temp_ / "state/card.state");
@@ -139,6 +139,11 @@ TEST_P(SettingsProgramTest, ChosenCentreReachesTheCardOnConnectAndOnSelect) {
     EXPECT_TRUE(Shows("settings-centre chosen +441234567")) << Log();
     EXPECT_TRUE(CardKeeps("sms-centre +441234567\n")) << Read(temp_ / "state/card.state");
     EXPECT_TRUE(CardKeeps("sms-params 255 ")) << Read(temp_ / "state/card.state");
+    // Deleting the centre in use gives the card the SIM's own centre again.
+    Tap(kCentreDelete);
+    EXPECT_TRUE(Shows("settings-centre sim default")) << Log();
+    EXPECT_TRUE(CardKeeps("sms-centre +3097100000\n")) << Read(temp_ / "state/card.state");
+    EXPECT_TRUE(CardKeeps("sms-params 167 ")) << Read(temp_ / "state/card.state");
 }
 
 TEST_P(SettingsProgramTest, ModemPageWritesTheInitCommandForWvdialAndTheDriver) {

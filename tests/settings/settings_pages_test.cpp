@@ -398,6 +398,71 @@ TEST_P(SettingsPagesTest, CentresPushedToTheCardOnSelectAndSimDefault) {
     EXPECT_EQ(Column(again.List(), 0, kCentreImageRole), (std::vector<std::u16string>{u"1"}));
 }
 
+// Deleting the centre the card uses gives the card the SIM's own centre, as "Use SIM Default"
+// does; deleting any other changes nothing on the card. A card gone meanwhile leaves the box
+// off, as any failed push does.
+TEST_P(SettingsPagesTest, DeletingTheChosenCentreFallsBackToTheSimDefault) {
+    const struct {
+        int chosen;
+        bool useSim;
+        int deleted;
+        bool pull;  // the card is pulled before the delete
+        bool pushed, boxChecked;
+        int chosenAfter;
+        std::vector<std::u16string> marks;
+        const char* centre;  // what the card reports afterwards; nullptr when pulled
+        const char* csmp;
+    } cases[] = {
+        {1, false, 1, false, true, true, -1, {u"0", u"0"}, "+CSCA: \"+3097100000\"", "+CSMP: 167,"},
+        {1, false, 0, false, false, false, 0, {u"1", u"0"}, "+CSCA: \"+302\"", "+CSMP: 23,"},
+        // Already on the SIM's own centre: nothing to send.
+        {1, true, 1, false, false, true, -1, {u"0", u"0"}, "+CSCA: \"+309\"", "+CSMP: 71,"},
+        {0, false, 0, true, true, false, -1, {u"0", u"0"}, nullptr, nullptr},
+    };
+    int n = 0;
+    for (const auto& c : cases) {
+        SCOPED_TRACE(n++);
+        SetSettingInt(settings_, u"SettingsMessagesCenters", std::array<int32_t, 1>{0}.data());
+        for (const char16_t* number : {u"+301", u"+302", u"+303"}) {
+            CentreEntry entry;
+            entry.number = number;
+            entry.validity = u"24 hours";
+            SaveCentre(settings_, static_cast<int>(LoadCentres(settings_).entries.size()), entry);
+        }
+        SaveChosenCentre(settings_, c.chosen);
+        SaveUseSimDefault(settings_, c.useSim);
+        pages_.clear();
+        CentrePage& page = Make<CentrePage>();
+        Connected(page);
+        Settle(page);
+        if (c.useSim) {
+            // Something the SIM default would change, to see that nothing was sent.
+            ASSERT_NE(Card("AT+CSCA=\"+309\"\r").find("OK"), std::string::npos);
+            ASSERT_NE(Card("AT+CSMP=71\r").find("OK"), std::string::npos);
+        }
+        if (c.pull) {
+            ASSERT_EQ(sim_->Control("pull"), "OK");
+        }
+
+        page.List()->setCurrentItem(page.List()->topLevelItem(c.deleted));
+        page.DeleteCentre();
+        EXPECT_EQ(page.Busy(), c.pushed);
+        if (c.pushed) {
+            EXPECT_NE(QApplication::overrideCursor(), nullptr);
+        }
+        Settle(page);
+        EXPECT_EQ(qobject_cast<QCheckBox*>(FindControl(&page, kCentreUseSimId))->isChecked(),
+                  c.boxChecked);
+        EXPECT_EQ(Int(u"SettingsMessagesUseSIMDefault"), c.boxChecked ? 1 : 0);
+        EXPECT_EQ(Int(u"SettingsMessagesChosenCenter"), c.chosenAfter);
+        EXPECT_EQ(Column(page.List(), 0, kCentreImageRole), c.marks);
+        if (c.centre) {
+            EXPECT_NE(Card("AT+CSCA?\r").find(c.centre), std::string::npos) << Card("AT+CSCA?\r");
+            EXPECT_NE(Card("AT+CSMP?\r").find(c.csmp), std::string::npos) << Card("AT+CSMP?\r");
+        }
+    }
+}
+
 TEST_P(SettingsPagesTest, ModemPageWritesTheCommandOnSelectionClickAndLeaving) {
     const auto value = [this] { return ReadAll(ModemInitValuePath(files_)); };
     const auto command = [this] {
