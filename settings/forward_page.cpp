@@ -18,6 +18,7 @@
 #include "shell/dialogs.h"
 #include "shell/messages.h"
 #include "shell/ui_log.h"
+#include "support/gsm.h"
 #include "support/settings_store.h"
 
 namespace vqm {
@@ -102,9 +103,9 @@ void CardJobs::Run(std::function<int(Link&)> exchange, std::function<void(int)> 
 
 // ForwardDialog
 
-ForwardDialog::ForwardDialog(QWidget* parent, SettingsStore& settings, int serviceClass, int reason,
+ForwardDialog::ForwardDialog(QWidget* parent, ShellContext& context, int serviceClass, int reason,
                              const QString& rowText)
-    : QDialog(parent), settings_(settings), serviceClass_(serviceClass), reason_(reason) {
+    : QDialog(parent), context_(context), serviceClass_(serviceClass), reason_(reason) {
     setObjectName("FORWARD_REQUEST_DIALOG");
     setWindowTitle("Forward Request");
     auto* layout = new QVBoxLayout(this);
@@ -146,8 +147,8 @@ void ForwardDialog::ChooseActivate() {
     deactivate_->setChecked(false);
     time_->setEnabled(reason_ == kForwardNoReply);
     char16_t stored[33] = u"";
-    if (!GetSettingString(settings_, StoredNumberName(serviceClass_, reason_).c_str(), stored,
-                          std::size(stored)))
+    if (!GetSettingString(context_.settings, StoredNumberName(serviceClass_, reason_).c_str(),
+                          stored, std::size(stored)))
         std::char_traits<char16_t>::copy(stored, kUnknown, std::size(kUnknown));
     number_->setText(QString::fromStdU16String(stored));
     number_->setFocus();
@@ -162,6 +163,30 @@ void ForwardDialog::ChooseDeactivate() {
 
 int ForwardDialog::Seconds() const {
     return reason_ == kForwardNoReply ? (time_->currentIndex() + 1) * 10 : 20;
+}
+
+std::u16string ForwardDialog::NumberProblem() const {
+    if (!activate_->isChecked()) return {};
+    const std::u16string number = number_->text().left(32).toStdU16String();
+    if (IsValidPhoneNumber(number.c_str())) return {};
+    // The edit opens on "Unknown" when no number was used before; the card would be asked to
+    // forward to that text.
+    constexpr char16_t kAsk[] = u"Please enter the number to forward the calls to.";
+    if (number_->text().trimmed().isEmpty()) return kAsk;
+    return u"\"" + number + u"\" is not a phone number.\n" + kAsk;
+}
+
+void ForwardDialog::done(int result) {
+    if (result == 1) {
+        const std::u16string problem = NumberProblem();
+        if (!problem.empty()) {
+            context_.dialogs.MessageBox(this, problem, kBoxTitle, kMbIconExclamation);
+            number_->setFocus();
+            number_->selectAll();
+            return;
+        }
+    }
+    QDialog::done(result);
 }
 
 // ForwardPage
@@ -271,11 +296,15 @@ void ForwardPage::Request(int index) {
 
 void ForwardPage::OpenRow(int index, int reason) {
     const int serviceClass = ClassOf(index);
-    ForwardDialog dialog(this, context_.settings, serviceClass, reason,
-                         State(index, reason)->text());
+    ForwardDialog dialog(this, context_, serviceClass, reason, State(index, reason)->text());
     if (context_.dialogs.Run(&dialog) != 1) return;  // Cancel, or closed
     const bool activate = dialog.Activate()->isChecked();
     if (!activate && !dialog.Deactivate()->isChecked()) return;
+    // A person cannot send such a number (the dialog stays open); a script's answer can.
+    if (const std::u16string problem = dialog.NumberProblem(); !problem.empty()) {
+        context_.dialogs.MessageBox(this, problem, kBoxTitle, kMbIconExclamation);
+        return;  // the row keeps its text
+    }
     const std::u16string number = dialog.Number()->text().left(32).toStdU16String();
     const int seconds = dialog.Seconds();
     jobs_.Run(

@@ -67,7 +67,7 @@ inline constexpr int kForwardActivateRadioId = 1153, kForwardDeactivateRadioId =
 // "Forward Request": activate to a number or deactivate one class and reason.
 class ForwardDialog : public QDialog {
   public:
-    ForwardDialog(QWidget* parent, SettingsStore& settings, int serviceClass, int reason,
+    ForwardDialog(QWidget* parent, ShellContext& context, int serviceClass, int reason,
                   const QString& rowText);
     QRadioButton* Activate() const { return activate_; }
     QRadioButton* Deactivate() const { return deactivate_; }
@@ -75,12 +75,17 @@ class ForwardDialog : public QDialog {
     QComboBox* TimeList() const { return time_; }
     // The no-reply time to send: the list's choice for "Unanswered:", 20 s for every other reason.
     int Seconds() const;
+    // Why "Send Request" cannot go to the card: "Activate To:" with an edit that does not hold a
+    // phone number ("Unknown", nothing, letters). Empty when it can.
+    std::u16string NumberProblem() const;
+    // "Send Request" with a number problem shows it and keeps the dialog open.
+    void done(int result) override;
 
   private:
     void ChooseActivate();
     void ChooseDeactivate();
 
-    SettingsStore& settings_;
+    ShellContext& context_;
     int serviceClass_, reason_;
     QRadioButton* activate_;
     QRadioButton* deactivate_;

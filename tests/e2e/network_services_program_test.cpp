@@ -70,6 +70,13 @@ INSTANTIATE_TEST_SUITE_P(Dialects, NetworkServicesProgramTest,
 TEST_P(NetworkServicesProgramTest, BusyVoiceCallsForwardedAndRequestShowsIt) {
     ASSERT_NO_FATAL_FAILURE(Start());
     Tap(kPageForward);
+    // "Activate To:" alone leaves the "Unknown" it offers: refused before the card.
+    ASSERT_TRUE(TapWithDialog(kBusyRowButton, "FORWARD_REQUEST_DIALOG 1153")) << Log();
+    EXPECT_TRUE(
+        Shows("box VQM Dialer: \"Unknown\" is not a phone number. / Please enter the "
+              "number to forward the calls to. -> OK"))
+        << Log();
+    EXPECT_EQ(Read(temp_ / "state/card.state").find("net-forward 1 1 "), std::string::npos);
     ASSERT_TRUE(TapWithDialog(kBusyRowButton, "FORWARD_REQUEST_DIALOG 1153 1149=+441234567890"))
         << Log();
     EXPECT_TRUE(CardKeeps("net-forward 1 1 +441234567890 145 20 1\n"))

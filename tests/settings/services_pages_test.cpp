@@ -205,12 +205,18 @@ TEST_P(ServicesPagesTest, ForwardDialogSendsTheChoiceAndTheRowFollows) {
         int reason;
         Choice choice;
         const char16_t* number;
-        int timeIndex;        // -1 leaves "20"
-        const char* state;    // the card's kept forward afterwards ("" none), or gone
-        const char16_t* row;  // the row's text afterwards
-        bool stored;          // the number is kept as the last one used
+        int timeIndex;                  // -1 leaves "20"
+        const char* state;              // the card's kept forward afterwards ("" none), or gone
+        const char16_t* row;            // the row's text afterwards
+        bool stored;                    // the number is kept as the last one used
+        const char16_t* box = nullptr;  // refused before the card, with this box
     };
+    const std::u16string ask = u"Please enter the number to forward the calls to.";
+    const std::u16string unknown = u"\"Unknown\" is not a phone number.\n" + ask;
+    const std::u16string letters = u"\"12ab\" is not a phone number.\n" + ask;
     const Case cases[] = {
+        // "Activate To:" offers "Unknown" while no number was used there: not sent.
+        {1, Activate, nullptr, -1, "!net-forward 1 1", u"Unknown", false, unknown.c_str()},
         {1, Activate, u"+441234567890", 2, "net-forward 1 1 +441234567890 145 20 1",
          u"+441234567890", true},
         {2, Activate, u"0123", 0, "net-forward 2 1 0123 129 10 1", u"0123", true},
@@ -218,9 +224,18 @@ TEST_P(ServicesPagesTest, ForwardDialogSendsTheChoiceAndTheRowFollows) {
         {2, Activate, u"0125", 2, "net-forward 2 1 0125 129 30 1", u"0125", true},
         {0, Activate, u"0777", 0, "net-forward 0 1 0777 129 20 1", u"0777", true},
         {3, Activate, u"0999", 2, "net-forward 3 1 0999 129 20 1", u"0999", true},
-        {3, Deactivate, nullptr, -1, "!net-forward 3 1", u"NOT ACTIVE", false},
-        // Refused by the network (no number it can dial): the row keeps its text.
-        {1, Activate, u"12ab", -1, "net-forward 1 1 +441234567890", u"+441234567890", false},
+        // Deactivating does not look at the edit.
+        {3, Deactivate, u"Unknown", -1, "!net-forward 3 1", u"NOT ACTIVE", false},
+        // Not a phone number: refused with a box before the card, the row keeps its text.
+        {1, Activate, u"12ab", -1, "net-forward 1 1 +441234567890", u"+441234567890", false,
+         letters.c_str()},
+        {1, Activate, u"", -1, "net-forward 1 1 +441234567890", u"+441234567890", false,
+         ask.c_str()},
+        {1, Activate, u"   ", -1, "net-forward 1 1 +441234567890", u"+441234567890", false,
+         ask.c_str()},
+        // A phone number the network cannot dial (the blank): refused by the card, silently,
+        // and the row keeps its text.
+        {1, Activate, u"0123 456", -1, "net-forward 1 1 +441234567890", u"+441234567890", false},
         {1, Neither, nullptr, -1, "net-forward 1 1 +441234567890", u"+441234567890", false},
         {1, Cancel, u"0555", -1, "net-forward 1 1 +441234567890", u"+441234567890", false},
     };
@@ -252,7 +267,13 @@ TEST_P(ServicesPagesTest, ForwardDialogSendsTheChoiceAndTheRowFollows) {
             return c.choice == Cancel ? kIdCancel : kIdOk;
         });
         Click(page->SubPage(0), kForwardButtonFirstId + c.reason);
+        if (c.box) {
+            EXPECT_EQ(page->Jobs().Pending(), 0) << "sent to the card";
+        }
         Settle(page->Jobs());
+        EXPECT_EQ(TakeBoxes(),
+                  c.box ? std::vector<std::u16string>{c.box} : std::vector<std::u16string>{})
+            << c.state;
         const bool gone = c.state[0] == '!';
         EXPECT_TRUE(StateHas(gone ? c.state + 1 : c.state, !gone)) << c.state;
         EXPECT_EQ(page->State(0, c.reason)->text().toStdU16String(), c.row) << c.state;
@@ -261,14 +282,57 @@ TEST_P(ServicesPagesTest, ForwardDialogSendsTheChoiceAndTheRowFollows) {
         EXPECT_EQ(std::u16string(stored), c.stored ? std::u16string(c.number) : storedBefore);
     }
     EXPECT_TRUE(answers_.empty());
-    EXPECT_TRUE(boxes_.empty());  // this page tells by its rows, never by boxes
+}
+
+// A person's "Send Request" with something that is not a phone number shows why and leaves the
+// dialog open with the text, to be corrected; a phone number, or "Deactivate", closes it.
+TEST_P(ServicesPagesTest, ForwardDialogStaysOpenUntilItHoldsAPhoneNumber) {
+    const std::u16string ask = u"Please enter the number to forward the calls to.";
+    ForwardDialog dialog(&host_, context_, 1, kForwardBusy, "NOT ACTIVE");
+    QPushButton* send = nullptr;
+    for (QPushButton* button : dialog.findChildren<QPushButton*>())
+        if (button->text() == "Send Request") send = button;
+    ASSERT_NE(send, nullptr);
+    const struct {
+        bool activate;
+        const char16_t* number;  // nullptr keeps what the radio put there
+        std::vector<std::u16string> boxes;
+        bool closes;
+    } steps[] = {
+        {true, nullptr, {u"\"Unknown\" is not a phone number.\n" + ask}, false},
+        {true, u"", {ask}, false},
+        {true, u"Ann", {u"\"Ann\" is not a phone number.\n" + ask}, false},
+        {true,
+         u"123456789012345678901",
+         {u"\"123456789012345678901\" is not a phone number.\n" + ask},
+         false},
+        {true, u"+44 (20) 1234 5678", {}, true},
+        {false, u"Unknown", {}, true},
+    };
+    int n = 0;
+    for (const auto& step : steps) {
+        SCOPED_TRACE(n++);
+        dialog.setResult(0);
+        dialog.show();
+        qobject_cast<QRadioButton*>(FindControl(&dialog, step.activate ? kForwardActivateRadioId
+                                                                       : kForwardDeactivateRadioId))
+            ->click();
+        if (step.number) dialog.Number()->setText(QString::fromStdU16String(step.number));
+        send->click();
+        EXPECT_EQ(TakeBoxes(), step.boxes);
+        EXPECT_EQ(dialog.isVisible(), !step.closes);
+        EXPECT_EQ(dialog.result(), step.closes ? 1 : 0);
+        if (!step.closes && step.number) {
+            EXPECT_EQ(dialog.Number()->text().toStdU16String(), step.number);
+        }
+    }
 }
 
 // The time list counts only for "Unanswered:"; every other reason sends 20 seconds.
 TEST_P(ServicesPagesTest, ForwardDialogTimeIsTheListsOnlyForNoReply) {
     for (int reason = 0; reason < 4; ++reason)
         for (int index = 0; index < 3; ++index) {
-            ForwardDialog dialog(&host_, settings_, 1, reason, "Unknown");
+            ForwardDialog dialog(&host_, context_, 1, reason, "Unknown");
             dialog.Activate()->click();
             dialog.TimeList()->setCurrentIndex(index);
             EXPECT_EQ(dialog.Seconds(), reason == kForwardNoReply ? (index + 1) * 10 : 20)
