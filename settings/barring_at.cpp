@@ -43,18 +43,28 @@ int ParseBarringReply(const char* reply, int length, int serviceClass, CardError
     if (!reply || length <= 0) return -1;
     FieldCursor cursor(reply, length);
     if (!cursor.SeekPast(kClckTag)) return SettingsResult(reply, length, error);
-    int32_t status = 0, reportedClass = 0;
-    const int fields = settings_detail::ScanStatusAndClass(cursor, &status, &reportedClass);
-    if (fields == 0) return -1;
-    if (status == 0) return 0;
-    if (fields == 1) return 1;  // a lock that is not kept per class bars every class
-    return (reportedClass & serviceClass & 0xFF) != 0 ? 1 : 0;
+    // One line with the barred classes summed (the card), or one line per class (27.007
+    // modems: "+CLCK: 0,1", "+CLCK: 1,4", ...): barred when any line says so for a class that
+    // shares a bit with the asked one. The first line must be readable; a later one that is
+    // not is passed over.
+    bool first = true;
+    do {
+        int32_t status = 0, reportedClass = 0;
+        const int fields = settings_detail::ScanStatusAndClass(cursor, &status, &reportedClass);
+        if (fields == 0 && first) return -1;
+        first = false;
+        if (fields == 0 || status == 0) continue;
+        if (fields == 1) return 1;  // a lock that is not kept per class bars every class
+        if ((reportedClass & serviceClass & 0xFF) != 0) return 1;
+    } while (cursor.SeekPast(kClckTag));
+    return 0;
 }
 
 int QueryBarring(Link& link, int serviceClass, int facility, CardError* error) {
     if (error) *error = CardError{};
     if (serviceClass < 1 || serviceClass > 4 || !BarringFacility(facility)) return -1;
-    char command[32], reply[256];
+    // Room for a line per class of a modem that lists all eight.
+    char command[32], reply[512];
     std::snprintf(command, sizeof command, "AT+CLCK=\"%s\",2\r", kFacilities[facility]);
     const int length = static_cast<int>(AtCommand(link, command, reply, sizeof reply));
     if (length == 0) return -1;

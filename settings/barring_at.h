@@ -13,12 +13,14 @@ inline constexpr int kBarringFacilityCount = 8;
 // The two-letter facility of an index 0..7; nullptr outside.
 const char* BarringFacility(int facility);
 
-// "AT+CLCK=<fac>,2": 1 when the reported class shares a bit with serviceClass, 0 when it does
-// not or the status is 0; without "+CLCK:" the reply's final result code (so ERROR and a
-// "+CME ERROR" show as 4, never as "not barred"). -1 for a class outside 1..4 or a facility outside
-// 0..7.
+// "AT+CLCK=<fac>,2": 1 when a reported class with status 1 shares a bit with serviceClass, 0
+// when none does; every "+CLCK:" line is read, so a reply of one line per class counts as well
+// as one line with the classes summed. Without "+CLCK:" the reply's final result code (so ERROR
+// and a "+CME ERROR" show as 4, never as "not barred"). -1 for a class outside 1..4 or a facility
+// outside 0..7.
 int QueryBarring(Link& link, int serviceClass, int facility, CardError* error = nullptr);
-// The query reply's scan on its own (a status of 1 without a class counts as barred).
+// The query reply's scan on its own (a status of 1 without a class counts as barred; a first
+// "+CLCK:" line without a status is -1).
 int ParseBarringReply(const char* reply, int length, int serviceClass, CardError* error = nullptr);
 
 // "AT+CLCK=<fac>,1,<password>,<class>" for facilities 0..4. The final result code, -1 when no

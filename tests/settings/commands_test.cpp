@@ -186,6 +186,10 @@ TEST_F(CommandsTest, BarringAndCodes) {
     Answer("AT+CLCK=\"AO\",2", "\r\n+CLCK: 1,7\r\n\r\nOK\r\n");
     for (int serviceClass : {1, 2, 4})
         EXPECT_EQ(QueryBarring(*link_, serviceClass, 0), 1);
+    // A modem's line per class: fax barred after voice and data that are not.
+    Answer("AT+CLCK=\"AO\",2", "\r\n+CLCK: 0,1\r\n+CLCK: 0,2\r\n+CLCK: 1,4\r\n\r\nOK\r\n");
+    for (int serviceClass : {1, 2, 4})
+        EXPECT_EQ(QueryBarring(*link_, serviceClass, 0), serviceClass == 4 ? 1 : 0);
     Answer("AT+CLCK=\"AO\",2", kError);
     EXPECT_EQ(QueryBarring(*link_, 1, 0), 4);  // a failure, not "not barred"
     Answer("AT+CLCK=\"OI\",1,\"1111\",1", "\r\n+CME ERROR: 16\r\n");

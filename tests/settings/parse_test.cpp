@@ -231,6 +231,48 @@ TEST(BarringScan, ReportedClassesAgainstTheAskedOne) {
     EXPECT_EQ(Barring("\r\n+CLCK: ?\r\nOK\r\n", 1), -1);
 }
 
+// The card sums the barred classes on one line; a 27.007 modem answers one line per class.
+// Either way each sub-page's class reads its own state.
+TEST(BarringScan, EveryLineOfEitherLayout) {
+    const std::string perClass = "\r\n+CLCK: 1,1\r\n+CLCK: 0,2\r\n+CLCK: 1,4\r\n\r\nOK\r\n";
+    const std::string faxOnly = "\r\n+CLCK: 0,1\r\n+CLCK: 0,2\r\n+CLCK: 1,4\r\n\r\nOK\r\n";
+    const std::string noneBarred = "\r\n+CLCK: 0,1\r\n+CLCK: 0,2\r\n+CLCK: 0,4\r\n\r\nOK\r\n";
+    // Every class of 27.007 listed, only data circuit sync (16) barred: no bit of 1, 2 or 4.
+    std::string eight = "\r\n";
+    for (int bit = 1; bit <= 128; bit <<= 1)
+        eight += "+CLCK: " + std::string(bit == 16 ? "1," : "0,") + std::to_string(bit) + "\r\n";
+    eight += "\r\nOK\r\n";
+    const struct {
+        std::string reply;
+        int voice, data, fax;  // what the sub-page of each class reads
+    } cases[] = {
+        // One line, summed.
+        {"\r\n+CLCK: 1,7\r\n\r\nOK\r\n", 1, 1, 1},
+        {"\r\n+CLCK: 1,5\r\n\r\nOK\r\n", 1, 0, 1},
+        {"\r\n+CLCK: 1,4\r\n\r\nOK\r\n", 0, 0, 1},
+        {"\r\n+CLCK: 0,7\r\n\r\nOK\r\n", 0, 0, 0},
+        {"\r\n+CLCK: 1\r\n\r\nOK\r\n", 1, 1, 1},
+        // A line per class.
+        {perClass, 1, 0, 1},
+        {faxOnly, 0, 0, 1},
+        {noneBarred, 0, 0, 0},
+        {eight, 0, 0, 0},
+        {"\r\n+CLCK: 0,1\r\n+CLCK: 1,7\r\n\r\nOK\r\n", 1, 1, 1},
+        {"\r\n+CLCK: 0,1\r\n+CLCK: 1\r\n\r\nOK\r\n", 1, 1, 1},
+        // A later line that cannot be read is passed over; an unreadable first one is no answer.
+        {"\r\n+CLCK: 0,1\r\n+CLCK: ?\r\n+CLCK: 1,4\r\n\r\nOK\r\n", 0, 0, 1},
+        {"\r\n+CLCK: 1,2\r\n+CLCK:", 0, 1, 0},
+        {"\r\n+CLCK: ?\r\n+CLCK: 1,7\r\n\r\nOK\r\n", -1, -1, -1},
+        // A line cut off by the end of the reply.
+        {"\r\n+CLCK: 0,1\r\n+CLCK: 1,", 1, 1, 1},
+    };
+    for (const auto& c : cases) {
+        EXPECT_EQ(Barring(c.reply, 1), c.voice) << c.reply;
+        EXPECT_EQ(Barring(c.reply, 2), c.data) << c.reply;
+        EXPECT_EQ(Barring(c.reply, 4), c.fax) << c.reply;
+    }
+}
+
 TEST(LockScan, StatusOrFinalResult) {
     auto lock = [](const std::string& reply) {
         return ParseLockReply(reply.data(), static_cast<int>(reply.size()));
