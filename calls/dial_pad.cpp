@@ -116,6 +116,7 @@ long DialPad::OnMessage(unsigned msg, long wParam, long lParam) {
             OnCardState(static_cast<int>(wParam));
             return 0;
         case kMsgDialResult:
+            dialResultIn_ = true;
             OnDialResult(static_cast<int>(wParam));
             return 0;
         case kMsgCallActive:
@@ -165,6 +166,10 @@ void DialPad::Destroy() {
 }
 
 void DialPad::JoinDialThread() {
+    // A dial whose result is in is only leaving its send: wait for it rather than refuse the
+    // next dial (a Call pressed right after "Number is busy" would do nothing).
+    if (dialThread_.joinable() && dialResultIn_)
+        ui_.WaitWhileDelivering([this] { return dialThreadDone_.load(); });
     if (dialThread_.joinable() && dialThreadDone_.load()) dialThread_.join();
 }
 
@@ -245,6 +250,7 @@ int DialPad::DialStart(const char* number) {
     std::snprintf(request, sizeof request, "%s", number ? number : "");
     cancel_.store(0);
     dialThreadDone_.store(false);
+    dialResultIn_ = false;
     dialThread_ = std::thread([this, request]() mutable {
         const int result = DialExchange(link_, request, cancel_);
         ui_.SendToDialPad(kMsgDialResult, result, 0);

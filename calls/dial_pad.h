@@ -206,6 +206,7 @@ class DialPad {
     std::atomic<int> cancel_{0};
     std::thread dialThread_;
     std::atomic<bool> dialThreadDone_{true};
+    bool dialResultIn_ = false;  // the dial thread's result was handled (window's thread)
 
     Notices notices_;
     std::u16string ringingCaller_;
