@@ -309,14 +309,8 @@ Result Status(Context& context, bool json) {
     char16_t manufacturer[64] = {}, model[64] = {}, firmware[64] = {}, operatorName[64] = {};
     if (!GetCardIdentity(context.link, manufacturer, 64, model, 64, firmware, 64))
         return Fail(kExitRefused, "The card did not answer.");
-    // The signal query gives way to any other exchange rather than wait for the port (the
-    // dialer's polls hold it often), so it is asked again for up to a second.
-    int bars = GetSignalBars(context.link);
-    for (int attempt = 0; attempt < 20 && bars < 0 && context.link.portState.load() > 0;
-         ++attempt) {
-        std::this_thread::sleep_for(std::chrono::milliseconds(50));
-        bars = GetSignalBars(context.link);
-    }
+    // Asked in turn: the dialer's own polls hold the port often.
+    const int bars = GetSignalBars(context.link, true);
     const bool haveOperator = GetOperatorName(context.link, operatorName, 64);
     long power = -1;
     if (!context.companionPath.empty())
