@@ -11,7 +11,6 @@
 #include <fstream>
 #include <memory>
 #include <sstream>
-#include <thread>
 
 #include "calls/call_log.h"
 #include "contacts/address_book.h"
