@@ -125,6 +125,12 @@ TEST_P(DialerProgramTest, CallsComeAndGoAndAreLogged) {
     ASSERT_TRUE(LogShows("status +447700900123")) << Log();
     Key(1138);
     ASSERT_TRUE(LogShows("status Voice call")) << Log();
+    // Line noise in the middle of the call is no empty call list: the call stays up through
+    // the next two polls (a wrong end would show within one).
+    EXPECT_EQ(Ctl("garbage 500").second, 0);
+    std::this_thread::sleep_for(2s);
+    EXPECT_EQ(Count("status Call ended"), 0u) << Log();
+    EXPECT_NE(Ctl("status").first.find("call=active"), std::string::npos);
     EXPECT_EQ(Ctl("remote-hangup").second, 0);
     ASSERT_TRUE(LogShows("status Call ended")) << Log();
 
