@@ -200,10 +200,10 @@ bool BarringPage::AskPassword(std::u16string* password) {
 }
 
 void BarringPage::Bar(int index, int buttonId) {
-    const BarButton* spec = ButtonOf(buttonId);
+    const BarButton* button = ButtonOf(buttonId);
     std::u16string password;
-    if (!spec || spec->facility >= kAllBarrings || !AskPassword(&password)) return;
-    const int serviceClass = ClassOf(index), facility = spec->facility;
+    if (!button || button->facility >= kAllBarrings || !AskPassword(&password)) return;
+    const int serviceClass = ClassOf(index), facility = button->facility;
     auto error = std::make_shared<CardError>();
     jobs_.Run(
         [=](Link& link) {
