@@ -7,16 +7,26 @@
 #include <QJsonArray>
 #include <QJsonDocument>
 #include <QJsonObject>
+#include <QStringList>
+#include <algorithm>
 #include <chrono>
 #include <cstdio>
 #include <filesystem>
 #include <fstream>
+#include <map>
 #include <sstream>
 #include <string>
 #include <tuple>
+#include <vector>
 
+#include "calls/call_log.h"
+#include "link/link.h"
+#include "messaging/message_store.h"
+#include "messaging/sms_folder.h"
+#include "messaging/write_sms.h"
 #include "support/local_socket.h"
 #include "support/settings_store.h"
+#include "support/text.h"
 #include "tests/common/process.h"
 #include "tests/common/temp_folder.h"
 
@@ -61,6 +71,12 @@ class VqmPhoneTest : public ::testing::TestWithParam<std::tuple<const char*, boo
         // put the SIM's default (none on the simulated card) in its place at start-up.
         const int32_t keep = 0;
         SetSettingInt(settings, u"SettingsMessagesUseSIMDefault", &keep);
+        // The folders and logs where the programs keep them (XDG_DATA_HOME below), named here so
+        // that a case can file into them itself; the desktop book is a vCard folder of the test.
+        fs::create_directories(install_);
+        SetSettingString(settings, u"InstallPath", Utf8ToUtf16(install_).c_str());
+        fs::create_directories(temp_ / "contacts");
+        SetSettingString(settings, u"ContactsFolder", Utf8ToUtf16(temp_ / "contacts").c_str());
     }
     ~VqmPhoneTest() override {
         if (ServerAnswers(DialerSocket())) SendWindowMessage(DialerSocket(), 273, 40016, 0, 2000);
@@ -114,17 +130,67 @@ class VqmPhoneTest : public ::testing::TestWithParam<std::tuple<const char*, boo
         EXPECT_EQ(run.code, 0) << arguments << ": " << Errors();
         return Parse(run.output).array();
     }
-    std::string WriteVCards(const std::string& name, int count) {
+    std::string WriteVCards(const std::string& name, int count, const std::string& who = "Person",
+                            int first = 10000) {
         const std::string path = temp_ / name;
         std::ofstream file(path);
         for (int i = 0; i < count; ++i)
-            file << "BEGIN:VCARD\r\nVERSION:3.0\r\nFN:Person " << i << "\r\nTEL;TYPE=CELL:+4477009"
-                 << 10000 + i << "\r\nEND:VCARD\r\n";
+            file << "BEGIN:VCARD\r\nVERSION:3.0\r\nFN:" << who << " " << i
+                 << "\r\nTEL;TYPE=CELL:+4477009" << first + i << "\r\nEND:VCARD\r\n";
         return path;
+    }
+    // A folder's listing: its rows by number, each with the start of its text.
+    struct FolderCase {
+        std::string arguments, folder, memory;
+        std::vector<std::pair<QString, QString>> rows;  // number, start of the preview
+    };
+    void ExpectPage(const FolderCase& c) {
+        SCOPED_TRACE(c.arguments);
+        const QJsonArray page = Array(c.arguments);
+        ASSERT_EQ(page.size(), static_cast<qsizetype>(c.rows.size()))
+            << QJsonDocument(page).toJson().toStdString();
+        for (const auto& [number, text] : c.rows) {
+            const auto row = std::find_if(page.begin(), page.end(), [&](const QJsonValue& v) {
+                return v.toObject()["number"].toString() == number;
+            });
+            ASSERT_NE(row, page.end()) << number.toStdString();
+            const QJsonObject found = row->toObject();
+            EXPECT_TRUE(found["preview"].toString().startsWith(text))
+                << found["preview"].toString().toStdString();
+            EXPECT_EQ(found["folder"].toString().toStdString(), c.folder);
+            EXPECT_EQ(found["memory"].toString().toStdString(), c.memory);
+        }
+    }
+    // A draft saved as the Write SMS view saves one and a message pasted onto the PC page,
+    // both filed by the SMS Folder's own paste, as a user leaves them before vqm-phone runs.
+    void SeedComputerPages() {
+        SettingsStore settings(temp_ / "settings.db");
+        MessageStore store(settings);
+        StoreGuardCreate(store);
+        Link link(settings, {});  // the computer's pages never reach the card
+        const FolderUi ui;
+        store.hooks.pasteInto = [&](int page) { PasteIntoPage(store, link, page, ui); };
+        ASSERT_EQ(SaveDraft(store, u"Buy milk on the way home"), 1);
+        SmsRecord kept{};
+        const std::u16string text = u"Kept on the computer";
+        ASSERT_GT(RecordBodyFromText(text.data(), text.size(), &kept), 0);
+        std::snprintf(kept.number, sizeof kept.number, "+447700900777");
+        StampLocalTime(&kept);
+        ASSERT_EQ(ClipboardAppend(store, kept), 1);
+        ASSERT_EQ(PasteIntoPage(store, link, kPagePda, ui), 1);
+    }
+    // Calls the dial pad would have logged: one answered, two unanswered (one without a number).
+    void SeedCallLogs() {
+        SettingsStore settings(temp_ / "settings.db");
+        CallLog log(settings);
+        ASSERT_EQ(AddAnsweredCall(log, "+447700900111"), 1);
+        ASSERT_EQ(AddUnansweredCall(log, "+447700900222"), 1);
+        ASSERT_EQ(AddUnansweredCall(log, "No number"), 1);
     }
 
     const testing::TempFolder temp_;
     const std::string run_ = temp_ / "xdg/VQMFull";
+    const std::string install_ = temp_ / "data/VQMFull/";
     Background card_;
     Background dialer_;
 };
@@ -145,6 +211,7 @@ TEST_P(VqmPhoneTest, StatusNamesTheCardItsNetworkAndSignal) {
 }
 
 TEST_P(VqmPhoneTest, DialsHangsUpAndLogsTheCall) {
+    ASSERT_NO_FATAL_FAILURE(SeedCallLogs());
     Start();
     PhoneRun run = Phone("dial 5550100");
     EXPECT_EQ(run.code, 0) << run.output << Errors();
@@ -153,10 +220,30 @@ TEST_P(VqmPhoneTest, DialsHangsUpAndLogsTheCall) {
     run = Phone("hangup");
     EXPECT_EQ(run.code, 0) << Errors();
     EXPECT_EQ(CardCall(), "none");
-    const QJsonArray log = Array("calllog dialed");
-    ASSERT_FALSE(log.isEmpty());
-    EXPECT_EQ(log.last().toObject()["number"].toString(), "5550100");
-    EXPECT_EQ(log.last().toObject()["log"].toString(), "dialed");
+
+    // Each log alone, and all three in the Call Log view's order; rows are "log number".
+    struct LogCase {
+        std::string arguments;
+        std::vector<std::string> rows;
+    };
+    const std::vector<LogCase> cases = {
+        {"calllog answered", {"answered +447700900111"}},
+        {"calllog dialed", {"dialed 5550100"}},
+        {"calllog unanswered", {"unanswered +447700900222", "unanswered "}},
+        {"calllog",
+         {"answered +447700900111", "dialed 5550100", "unanswered +447700900222", "unanswered "}},
+    };
+    for (const LogCase& c : cases) {
+        std::vector<std::string> rows;
+        for (const QJsonValue& row : Array(c.arguments))
+            rows.push_back(
+                (row.toObject()["log"].toString() + " " + row.toObject()["number"].toString())
+                    .toStdString());
+        EXPECT_EQ(rows, c.rows) << c.arguments;
+    }
+    run = Phone("calllog unanswered");
+    EXPECT_EQ(run.code, 0) << Errors();
+    EXPECT_NE(run.output.find("No number"), std::string::npos) << run.output;
 }
 
 TEST_P(VqmPhoneTest, AnswersARingingCallAndRefusesWhenNothingRings) {
@@ -189,23 +276,48 @@ TEST_P(VqmPhoneTest, SendsToEachRecipientAndFilesOnTheSentPage) {
     EXPECT_EQ(numbers, (QStringList{"+447700900123", "01632960001"}));
 }
 
-TEST_P(VqmPhoneTest, ReadsAnInboxMessageWhole) {
+TEST_P(VqmPhoneTest, ListsEachFolderAndReadsAMessageWhole) {
+    ASSERT_NO_FATAL_FAILURE(SeedComputerPages());
     Start();
-    const PhoneRun run = Phone("--json sms read 1");
+    // The demo SIM's unsent message and the computer's pages (the Inbox is listed after a
+    // delete, below).
+    const std::vector<FolderCase> cases = {
+        {"sms list --folder outbox", "outbox", "sim", {{"2101234567", "Call the bank tomorrow"}}},
+        {"sms list --folder sent", "sent", "pc", {}},
+        {"sms list --folder draft", "draft", "pc", {{"", "Buy milk on the way home"}}},
+        {"sms list --folder pc", "pc", "pc", {{"+447700900777", "Kept on the computer"}}},
+    };
+    for (const FolderCase& c : cases)
+        ExpectPage(c);
+    // For people: one line a message, or a word that the folder is empty.
+    PhoneRun run = Phone("sms list --folder draft");
+    EXPECT_EQ(run.code, 0) << Errors();
+    EXPECT_NE(run.output.find("Buy milk on the way home\n"), std::string::npos) << run.output;
+    run = Phone("sms list --folder sent");
+    EXPECT_EQ(run.output, "No messages in sent.\n");
+
+    run = Phone("--json sms read 1");
     ASSERT_EQ(run.code, 0) << Errors();
     const QJsonObject message = Parse(run.output).object();
     EXPECT_EQ(message["index"].toInt(), 1);
     EXPECT_EQ(message["folder"].toString(), "inbox");
     EXPECT_TRUE(message["text"].toString().startsWith("Welcome")) << run.output;
+    run = Phone("sms read 9 --folder pc");
+    EXPECT_EQ(run.code, 2) << run.output;
+    EXPECT_NE(Errors().find("No message 9 in pc."), std::string::npos) << Errors();
 }
 
 TEST_P(VqmPhoneTest, DeletesAnInboxMessageFromTheSim) {
     Start();
-    PhoneRun run = Phone("sms delete 2");
+    const PhoneRun run = Phone("sms delete 2");
     ASSERT_EQ(run.code, 0) << run.output << Errors();
-    run = Phone("sms read 2");
-    EXPECT_EQ(run.code, 2) << run.output;
-    EXPECT_NE(Errors().find("No message 2"), std::string::npos) << Errors();
+    // The Inbox (the folder listed by default) read afresh from the SIM: the demo's first and
+    // third messages are left.
+    ExpectPage({"sms list",
+                "inbox",
+                "sim",
+                {{"+306944123456", "Welcome to your new SIM."},
+                 {"6977654321", QString::fromUtf8("Καλημέρα!")}}});
 }
 
 TEST_P(VqmPhoneTest, ExportsTheSimAndCardContactsAsVCards) {
@@ -222,14 +334,45 @@ TEST_P(VqmPhoneTest, ExportsTheSimAndCardContactsAsVCards) {
     EXPECT_NE(cards.find("Alice Smith"), std::string::npos);
 }
 
-TEST_P(VqmPhoneTest, ImportsContactsIntoFreePlaces) {
+TEST_P(VqmPhoneTest, ImportsContactsIntoFreePlacesAndListsEachBook) {
+    WriteVCards("contacts/desk.vcf", 2, "Desk", 20000);
     Start();
     const PhoneRun run = Phone("contacts import --card --vcard " + WriteVCards("two.vcf", 2));
     ASSERT_EQ(run.code, 0) << Errors();
-    const QJsonArray card = Array("contacts list --card");
-    ASSERT_EQ(card.size(), 5) << QJsonDocument(card).toJson().toStdString();
-    EXPECT_EQ(card.last().toObject()["name"].toString(), "Person 1");
-    EXPECT_EQ(card.last().toObject()["number"].toString(), "+447700910001");
+    // Entries of each book a listing holds: the demo SIM's 8, the card's 3 and the two imported,
+    // the desktop folder's 2.
+    struct BookCase {
+        std::string arguments;
+        int sim, card, desktop;
+    };
+    const std::vector<BookCase> cases = {
+        {"contacts list --card", 0, 5, 0},
+        {"contacts list --desktop", 0, 0, 2},
+        {"contacts list", 8, 5, 2},
+    };
+    for (const BookCase& c : cases) {
+        SCOPED_TRACE(c.arguments);
+        const QJsonArray list = Array(c.arguments);
+        std::map<std::string, int> books;
+        std::map<std::string, std::string> last;  // the last name and number of each book
+        for (const QJsonValue& v : list) {
+            const QJsonObject entry = v.toObject();
+            const std::string book = entry["book"].toString().toStdString();
+            ++books[book];
+            last[book] =
+                (entry["name"].toString() + " " + entry["number"].toString()).toStdString();
+        }
+        EXPECT_EQ(books["sim"], c.sim);
+        EXPECT_EQ(books["card"], c.card);
+        EXPECT_EQ(books["desktop"], c.desktop);
+        EXPECT_EQ(books.size(), 3u);  // no other book named
+        if (c.card) {
+            EXPECT_EQ(last["card"], "Person 1 +447700910001");
+        }
+        if (c.desktop) {
+            EXPECT_EQ(last["desktop"], "Desk 1 +447700920001");
+        }
+    }
 }
 
 TEST_P(VqmPhoneTest, TenThousandContactsAreRefusedWithNothingWritten) {
