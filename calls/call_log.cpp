@@ -51,16 +51,6 @@ bool WriteRecords(const std::string& path, const std::vector<CallLogRecord>& rec
     return ReplaceFile(path, data);
 }
 
-// An append after a partial record would shift every later record off the 64-byte grid, and
-// the whole log would read as garbage from then on; the torn tail goes first.
-void DropPartialTail(const std::string& path) {
-    std::error_code error;
-    const auto size = std::filesystem::file_size(path, error);
-    if (error) return;
-    const auto whole = size - size % kCallLogRecordSize;
-    if (whole != size) std::filesystem::resize_file(path, whole, error);
-}
-
 std::tm NowLocal() {
     const std::time_t now = std::chrono::system_clock::to_time_t(std::chrono::system_clock::now());
     std::tm local{};
@@ -147,7 +137,7 @@ int AddCallLogEntry(CallLog& log, int logNumber, const char* number) {
             records.erase(records.begin());
             dropped = WriteRecords(path, records);
         }
-        DropPartialTail(path);
+        DropPartialTail(path, kCallLogRecordSize);
         if (FILE* file = std::fopen(path.c_str(), "a+b")) {
             written =
                 std::fwrite(&record, 1, sizeof record, file) == sizeof record && FlushToDisk(file);

@@ -109,6 +109,7 @@ FILE* CacheOpen(CacheGroup& group, int fileNumber, int mode) {
         return nullptr;
     if (!CacheAcquire(group.lock, mode)) return nullptr;
     const std::string path = CachePath(group, fileNumber);
+    if (mode == kCacheWrite) DropPartialTail(path, CacheRecordSize(group, fileNumber));
     // By the mode granted, not the word: another reader's close may already have cleared it,
     // and a reader must never create a file.
     return std::fopen(path.c_str(), mode == kCacheRead ? "rb" : "ab");

@@ -43,15 +43,6 @@ void Call(const std::function<void()>& hook) {
     if (hook) hook();
 }
 
-// An append after a torn record would shift every later record off the record grid.
-void DropPartialTail(const std::string& path, size_t recordSize) {
-    std::error_code error;
-    const auto size = std::filesystem::file_size(path, error);
-    if (error) return;
-    const auto whole = size - size % recordSize;
-    if (whole != size) std::filesystem::resize_file(path, whole, error);
-}
-
 // The rewrite shared by delete and status change: every whole record through change (which
 // may drop it by returning false) into the flushed "%s.tmp" copy, renamed over the folder
 // file in one step; a folder left empty is no file.

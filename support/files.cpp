@@ -2,6 +2,8 @@
 
 #include <unistd.h>
 
+#include <filesystem>
+
 namespace vqm {
 
 bool FlushToDisk(FILE* file) {
@@ -17,6 +19,14 @@ bool ReplaceFile(const std::string& path, const std::string& data) {
     if (ok && std::rename(tmpPath.c_str(), path.c_str()) == 0) return true;
     std::remove(tmpPath.c_str());
     return false;
+}
+
+void DropPartialTail(const std::string& path, size_t recordSize) {
+    std::error_code error;
+    const auto size = std::filesystem::file_size(path, error);
+    if (error || recordSize == 0) return;
+    const auto whole = size - size % recordSize;
+    if (whole != size) std::filesystem::resize_file(path, whole, error);
 }
 
 }  // namespace vqm

@@ -14,4 +14,9 @@ bool FlushToDisk(FILE* file);
 // Writes data to "<path>.tmp", flushes it to disk and renames it over path.
 bool ReplaceFile(const std::string& path, const std::string& data);
 
+// Cuts a file of fixed-size records back to its whole records. An append killed part-way
+// leaves a partial record, and the next append after it would shift every later record off
+// the record grid; appends call this first.
+void DropPartialTail(const std::string& path, size_t recordSize);
+
 }  // namespace vqm

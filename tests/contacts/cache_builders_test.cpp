@@ -212,6 +212,17 @@ TEST_F(CacheBuildersTest, ACrashedReplaceLeavesTheOldFileWhole) {
     ASSERT_EQ(file.size(), 2u);
     EXPECT_STREQ(file[0].number, "999");
     EXPECT_STREQ(file[1].number, "222");
+
+    // An append killed part-way leaves part of a record; the next append starts on the grid.
+    {
+        std::ofstream cut(CachePath(caches_.sim, 1), std::ios::binary | std::ios::app);
+        cut << "half a record";
+    }
+    EXPECT_EQ(SimCacheAppend(caches_.sim, 1, Entry(3, "333", "Cy")), 1);
+    file = SimFile(1);
+    ASSERT_EQ(file.size(), 3u);
+    EXPECT_STREQ(file[2].number, "333");
+    EXPECT_EQ(fs::file_size(CachePath(caches_.sim, 1)), 3 * sizeof(PhonebookEntry));
 }
 
 // The SIM builder against a scripted card
