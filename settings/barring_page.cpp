@@ -108,23 +108,10 @@ BarringPage::BarringPage(QWidget* parent, ShellContext& context)
     : View(parent), context_(context), jobs_(this, context) {
     setObjectName("SETTINGS_CALLBARRING_PAGE");
     if (parent) resize(parent->size());
-    for (int i = 0; i < kClasses; ++i) {
-        ViewRecord record;
-        record.caption = QString(kClassTitles[i]).toStdU16String();
-        record.className = kPageClasses[i];
-        record.windowProc = [this, i](QWidget* pageParent) -> View* {
-            auto* page = new View(pageParent);
-            BuildSubPage(page, i);
-            return page;
-        };
-        pages_.records.push_back(std::move(record));
-    }
-    const int buttonTop = height() - kMargin - kButtonHeight;
-    CreateTabbedPages(this, kBarringTabId, pages_, QRect(0, 0, width(), buttonTop - kMargin));
-    auto* all = new QPushButton("Disable All Call Barrings", this);
-    SetControlId(all, kLiftAllBarringsId);
-    all->setGeometry(kMargin, buttonTop, width() - 2 * kMargin, kButtonHeight);
-    QObject::connect(all, &QPushButton::clicked, this, [this] { LiftAll(); });
+    CreateClassPages(
+        this, pages_, kBarringTabId, kPageClasses,
+        [this](View* page, int index) { BuildSubPage(page, index); }, "Disable All Call Barrings",
+        kLiftAllBarringsId, kButtonHeight, [this] { LiftAll(); });
 }
 
 BarringPage::~BarringPage() = default;

@@ -56,6 +56,30 @@ long TapControl(QWidget* subPage, QWidget* page, int id) {
     return 1;
 }
 
+void CreateClassPages(View* page, ViewSet& pages, int tabId, const char* const pageClasses[3],
+                      const std::function<void(View*, int)>& build, const char* buttonText,
+                      int buttonId, int buttonHeight, const std::function<void()>& onClick) {
+    static constexpr const char* kTitles[3] = {"Voice", "Data", "Fax"};
+    for (int i = 0; i < 3; ++i) {
+        ViewRecord record;
+        record.caption = QString(kTitles[i]).toStdU16String();
+        record.className = pageClasses[i];
+        record.windowProc = [build, i](QWidget* pageParent) -> View* {
+            auto* subPage = new View(pageParent);
+            build(subPage, i);
+            return subPage;
+        };
+        pages.records.push_back(std::move(record));
+    }
+    // The tabs take the page but for the button row below them.
+    const int buttonTop = page->height() - kMargin - buttonHeight;
+    CreateTabbedPages(page, tabId, pages, QRect(0, 0, page->width(), buttonTop - kMargin));
+    auto* all = new QPushButton(buttonText, page);
+    SetControlId(all, buttonId);
+    all->setGeometry(kMargin, buttonTop, page->width() - 2 * kMargin, buttonHeight);
+    QObject::connect(all, &QPushButton::clicked, page, onClick);
+}
+
 void LogShown(ShellContext& context, const char* kind, const QString& text) {
     if (context.uiLog) context.uiLog->Line(kind, text.toStdU16String());
 }
@@ -195,24 +219,10 @@ ForwardPage::ForwardPage(QWidget* parent, ShellContext& context)
     : View(parent), context_(context), jobs_(this, context) {
     setObjectName("SETTINGS_CALLFORWARD_PAGE");
     if (parent) resize(parent->size());
-    for (int i = 0; i < kClasses; ++i) {
-        ViewRecord record;
-        record.caption = QString(kClassNames[i]).toStdU16String();
-        record.className = kPageClasses[i];
-        record.windowProc = [this, i](QWidget* pageParent) -> View* {
-            auto* page = new View(pageParent);
-            BuildSubPage(page, i);
-            return page;
-        };
-        pages_.records.push_back(std::move(record));
-    }
-    // The tabs take the page but for the button row below them.
-    const int buttonTop = height() - kMargin - kRowHeight;
-    CreateTabbedPages(this, kForwardTabId, pages_, QRect(0, 0, width(), buttonTop - kMargin));
-    auto* all = new QPushButton("Deactivate All Call Forward", this);
-    SetControlId(all, kForwardDeactivateAllId);
-    all->setGeometry(kMargin, buttonTop, width() - 2 * kMargin, kRowHeight);
-    QObject::connect(all, &QPushButton::clicked, this, [this] { DeactivateAll(); });
+    CreateClassPages(
+        this, pages_, kForwardTabId, kPageClasses,
+        [this](View* page, int index) { BuildSubPage(page, index); }, "Deactivate All Call Forward",
+        kForwardDeactivateAllId, kRowHeight, [this] { DeactivateAll(); });
 }
 
 ForwardPage::~ForwardPage() = default;

@@ -52,6 +52,12 @@ inline bool CardFailed(int result) {
 // A WM_COMMAND to a settings page (over the dialer's socket, or a menu): the control with
 // that id is tapped, looked for in the sub-page shown first, then in the page. 1 when found.
 long TapControl(QWidget* subPage, QWidget* page, int id);
+// The Voice, Data and Fax sub-pages of a network-service page under its tab strip (tabId),
+// each filled by build before the strip places it, and the page's one button for every class
+// in a row of the given height below them; the button's click runs onClick.
+void CreateClassPages(View* page, ViewSet& pages, int tabId, const char* const pageClasses[3],
+                      const std::function<void(View*, int)>& build, const char* buttonText,
+                      int buttonId, int buttonHeight, const std::function<void()>& onClick);
 // One line of what a page shows, for the dialer's --ui-log record: "<kind> <text>".
 void LogShown(ShellContext& context, const char* kind, const QString& text);
 
