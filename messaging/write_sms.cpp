@@ -105,6 +105,30 @@ ParsedRecipients ParseRecipients(const std::u16string& field) {
     return parsed;
 }
 
+std::u16string OverlongRecipient(const std::u16string& field) {
+    if (field.size() <= kRecipientsReadLimit) return {};
+    for (size_t start = 0; start < field.size();) {
+        size_t end = field.find(u';', start);
+        if (end == std::u16string::npos) end = field.size();
+        const std::u16string_view raw = std::u16string_view(field).substr(start, end - start);
+        const std::u16string_view token = Trim(raw);
+        // Where the entry's last character stands in the field.
+        const size_t tokenEnd =
+            start + static_cast<size_t>(token.data() - raw.data()) + token.size();
+        if (!token.empty() && tokenEnd > kRecipientsReadLimit) return std::u16string(token);
+        start = end + 1;
+    }
+    return {};
+}
+
+std::u16string RecipientsTooLongText(const std::u16string& entry) {
+    constexpr size_t kShown = 40;
+    const std::u16string shown = entry.size() > kShown ? entry.substr(0, kShown) + u"..." : entry;
+    return u"Too many recipients: only the first " + Widen(std::to_string(kRecipientsReadLimit)) +
+           u" characters are read, and \"" + shown +
+           u"\" does not fit in them. Please remove some recipients. Nothing has been sent.";
+}
+
 LengthCheck CheckLength(const std::u16string& text, int coding) {
     LengthCheck check;
     const bool gsm = coding == kCodingGsm;
@@ -186,9 +210,15 @@ bool PrepareBody(const std::u16string& textField,
 bool PrepareSend(const std::u16string& recipientsField, const std::u16string& textField,
                  const std::function<bool(const std::u16string& question)>& ask,
                  PreparedSend* prepared) {
-    const std::u16string recipients = recipientsField.substr(0, kRecipientsReadLimit);
-    if (recipients.empty()) return false;
     *prepared = PreparedSend{};
+    const std::u16string recipients = recipientsField.substr(0, kRecipientsReadLimit);
+    if (recipients.empty() || textField.empty()) return false;
+    // Only what is read is sent: an entry cut at the limit would reach a shortened number (a
+    // stranger's, perhaps) and those behind it nobody, without a word.
+    if (const std::u16string cut = OverlongRecipient(recipientsField); !cut.empty()) {
+        prepared->refusal = RecipientsTooLongText(cut);
+        return false;
+    }
     if (!PrepareBody(textField, ask, &prepared->body)) return false;
     prepared->recipients = ParseRecipients(recipients);
     return true;

@@ -54,6 +54,12 @@ struct ParsedRecipients {
 ParsedRecipients ParseRecipients(const std::u16string& field);
 // The number filter: '+' and '(' each give a '+', digits, '*' and '#' stay, the rest goes.
 std::string FilterNumber(std::u16string_view text);
+// The first entry (trimmed) that the kRecipientsReadLimit characters a send reads do not hold
+// whole: cut there, it would go to a shortened number, and every entry behind it would be left
+// out. Empty when all of the field's entries lie within the limit.
+std::u16string OverlongRecipient(const std::u16string& field);
+// The refusal of a send for such an entry, naming it.
+std::u16string RecipientsTooLongText(const std::u16string& entry);
 
 // The length check before a send: ask (OK cuts, Cancel abandons) when a 7-bit text has 161
 // characters or more or a UCS2 text 71 or more.
@@ -117,10 +123,13 @@ bool PrepareBody(const std::u16string& textField,
                  const std::function<bool(const std::u16string& question)>& ask, SmsRecord* body);
 
 // Everything Send does before the card: the recipients read, the body (PrepareBody) and the
-// recipients parsed. False when there is nothing to send or the question was cancelled.
+// recipients parsed. False when there is nothing to send, the question was cancelled, or the
+// recipients run past what is read: then refusal holds the box to show (naming the entry the
+// limit cuts), nothing is asked and nothing is sent to anyone.
 struct PreparedSend {
     SmsRecord body{};
     ParsedRecipients recipients;
+    std::u16string refusal;
 };
 bool PrepareSend(const std::u16string& recipientsField, const std::u16string& textField,
                  const std::function<bool(const std::u16string& question)>& ask,

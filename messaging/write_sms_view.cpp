@@ -82,8 +82,11 @@ WriteSmsView::WriteSmsView(QWidget* parent, ShellContext& context, WriteViewHook
     draft_ = button("Save To Draft", kWriteDraftId, [this] { SaveToDraft(); });
     clear_ = button("Clear All", kWriteClearId, [this] { ClearAll(); });
 
-    recipients_ = new QPlainTextEdit(this);
+    recipients_ = new LimitedTextEdit(this);
     SetControlId(recipients_, kWriteRecipientsId);
+    // A send reads this much of the field: no more can be typed. Entries the picker or another
+    // view adds stay whole, and Send refuses what runs past it.
+    recipients_->SetLimit(static_cast<int>(kRecipientsReadLimit));
     recipients_->setTabChangesFocus(true);
     text_ = new LimitedTextEdit(this);
     SetControlId(text_, kWriteTextId);
@@ -213,7 +216,12 @@ void WriteSmsView::Send() {
         return context_.dialogs.MessageBox(this, question, kErrorTitle,
                                            kMbOkCancel | kMbIconStop | kMbTopmost) == kIdOk;
     };
-    if (!PrepareSend(Recipients(), Text(), ask, &prepared)) return;
+    if (!PrepareSend(Recipients(), Text(), ask, &prepared)) {
+        if (!prepared.refusal.empty())
+            context_.dialogs.MessageBox(this, prepared.refusal, kErrorTitle,
+                                        kMbOk | kMbIconStop | kMbTopmost);
+        return;
+    }
     if (prepared.recipients.count > 0) SetRecipients(prepared.recipients.display);
 
     sending_ = true;

@@ -79,7 +79,7 @@ class WriteSmsView : public View {
     bool Sending() const { return sending_; }
     // Waits for a send under way, delivering its reports meanwhile.
     void WaitForSend();
-    QPlainTextEdit* RecipientsEdit() const { return recipients_; }
+    LimitedTextEdit* RecipientsEdit() const { return recipients_; }
     LimitedTextEdit* TextEdit() const { return text_; }
 
   protected:
@@ -102,7 +102,7 @@ class WriteSmsView : public View {
     QPushButton* send_ = nullptr;
     QPushButton* draft_ = nullptr;
     QPushButton* clear_ = nullptr;
-    QPlainTextEdit* recipients_ = nullptr;
+    LimitedTextEdit* recipients_ = nullptr;
     LimitedTextEdit* text_ = nullptr;
     QLabel* counter_ = nullptr;
     QLabel* status_ = nullptr;

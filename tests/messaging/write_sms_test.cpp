@@ -92,6 +92,48 @@ TEST(WriteSmsRecipients, ParseFilterAndDisplay) {
     }
 }
 
+// Entries "Pal<i><+4477009000<i>>;" of 22 characters with the field's own "\n" behind each.
+std::u16string Entries(int count) {
+    std::u16string field;
+    for (int i = 10; i < 10 + count; ++i)
+        field += U("Pal" + std::to_string(i) + "<+4477009000" + std::to_string(i) + ">;\n");
+    return field;
+}
+
+TEST(WriteSmsRecipients, TheEntryTheReadLimitCutsIsNamed) {
+    const std::u16string ten = Entries(10);  // 10 x 22 characters
+    ASSERT_EQ(ten.size(), 220u);
+    const std::u16string upTo256 = ten + std::u16string(35, u' ') + u"7";  // "7" is the 256th
+    ASSERT_EQ(upTo256.size(), 256u);
+    struct Case {
+        const char* what;
+        std::u16string field;
+        std::u16string named;
+    } cases[] = {
+        {"within the limit", ten, u""},
+        {"an entry ending on the 256th character", upTo256, u""},
+        {"and only blanks and separators behind it", upTo256 + u";\n ;;  \n", u""},
+        {"one entry behind it, left out", upTo256 + u";Bob<+44 1>", u"Bob<+44 1>"},
+        {"an entry across the limit", ten + std::u16string(30, u' ') + u"Ann<+447700900999>;7",
+         u"Ann<+447700900999>"},
+        {"twelve entries", Entries(12), u"Pal21<+447700900021>"},
+        {"a bare number across the limit", std::u16string(250, u';') + u"0123456789",
+         u"0123456789"},
+        {"letters only across the limit", std::u16string(250, u' ') + u"abcdefghij", u"abcdefghij"},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.what);
+        EXPECT_EQ(OverlongRecipient(c.field), c.named);
+    }
+    // The box names the entry, shortened when it is long.
+    EXPECT_EQ(RecipientsTooLongText(u"Bob<+44 1>"),
+              u"Too many recipients: only the first 256 characters are read, and \"Bob<+44 1>\" "
+              u"does not fit in them. Please remove some recipients. Nothing has been sent.");
+    const std::u16string longName = std::u16string(60, u'n') + u"<1>";
+    EXPECT_NE(RecipientsTooLongText(longName).find(std::u16string(40, u'n') + u"...\""),
+              std::u16string::npos);
+}
+
 TEST(WriteSmsLength, AsksAndCutsAtTheLimitOfItsAlphabet) {
     struct Case {
         std::u16string text;
@@ -145,6 +187,22 @@ TEST(WriteSmsPrepare, ReadsTheFieldsAsksAndBuildsTheBody) {
     EXPECT_EQ(prepared.body.coding, 8);
     EXPECT_EQ(prepared.body.length, static_cast<int>(greek.size() * 4));
     EXPECT_EQ(prepared.recipients.numbers, std::vector<std::string>{"+302101234567"});
+    EXPECT_TRUE(prepared.refusal.empty());
+
+    // Recipients running past what is read: refused before any question, naming the entry the
+    // limit cuts, with nothing parsed to send to; with no text, nothing at all as before.
+    asked.clear();
+    const std::u16string overlong = Entries(12);
+    EXPECT_FALSE(PrepareSend(overlong, Repeat(u"a", 161), answer(true), &prepared));
+    EXPECT_TRUE(asked.empty());
+    EXPECT_EQ(prepared.refusal, RecipientsTooLongText(u"Pal21<+447700900021>"));
+    EXPECT_TRUE(prepared.recipients.numbers.empty());
+    EXPECT_FALSE(PrepareSend(overlong, u"", answer(true), &prepared));
+    EXPECT_TRUE(prepared.refusal.empty());
+    // The same entries, one fewer so that all fit, go out.
+    ASSERT_TRUE(PrepareSend(Entries(11), u"Hi", answer(true), &prepared));
+    EXPECT_EQ(prepared.recipients.count, 11);
+    EXPECT_EQ(prepared.recipients.numbers.back(), "+447700900020");
 }
 
 TEST(WriteSmsRequests, ReplyForwardAndAddedRecipients) {
@@ -248,6 +306,11 @@ TEST_P(WriteSmsSendTest, EachRecipientInTurnUntilTheFirstFailure) {
          {"12345", "+44+2012345678"}},
         {u"Ann<>;12345", SendEnd::Rejected, 0, "", {}},  // an empty number ends the walk
         {u"abc", SendEnd::Nothing, 0, "", {}},           // no entry counted
+        // A name with letters for its number: the walk ends there without a word, as every
+        // rejected recipient ends it; the one before is sent and filed, the one after not tried.
+        {u"12345;Bob<abc>;777", SendEnd::Rejected, 1, "", {"12345"}},
+        // More recipients than a send reads: no one at all, rather than a cut number.
+        {Entries(12), SendEnd::Nothing, 0, "", {}},
     };
     size_t filed = 0;
     for (const Case& c : cases) {
