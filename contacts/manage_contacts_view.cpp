@@ -24,6 +24,7 @@
 #include "link/link.h"
 #include "shell/dialogs.h"
 #include "shell/messages.h"
+#include "shell/ui_log.h"
 #include "support/numbers.h"
 #include "support/settings_store.h"
 #include "support/text.h"
@@ -51,6 +52,11 @@ constexpr PageInfo kOutlookPages[3] = {
     {u"Home", "MANAGECONTACTS_OUTLOOK_HOME_PAGE"},
     {u"Work", "MANAGECONTACTS_OUTLOOK_WORK_PAGE"},
 };
+
+std::u16string PageTitle(int page) {
+    if (page >= kContactsMobilePage) return kOutlookPages[page - kContactsMobilePage].title;
+    return kTopPages[page].title;
+}
 
 bool IsSimPage(int page) {
     return page == kContactsSimPage || page == kContactsCardPage;
@@ -355,8 +361,13 @@ void ManageContactsView::resizeEvent(QResizeEvent* event) {
     Relayout();
 }
 
-long ManageContactsView::OnMessage(unsigned msg, long, long) {
+long ManageContactsView::OnMessage(unsigned msg, long wParam, long) {
     switch (msg) {
+        case kWmCommand:
+            // A menu command from outside (a script driving the dialer through its socket),
+            // as the page's own menu would give it.
+            Command(static_cast<int>(wParam & 0xFFFF));
+            break;
         case kMsgViewShown:
             Do(ContactsActivated(state_, cardState_()));
             break;
@@ -415,6 +426,9 @@ int ManageContactsView::OnCard(const std::function<int()>& work) {
 }
 
 void ManageContactsView::LearnGeometry() {
+    // The card is asked aside while the window goes on taking commands: none that needs the
+    // limits (New, Copy To, Import) may start before they are known.
+    learningGeometry_ = true;
     const struct {
         int storage;
         const char* prefix;
@@ -428,6 +442,7 @@ void ManageContactsView::LearnGeometry() {
         });
         if (selected) PhonebookSaveGeometry(context_.settings, book.prefix, number, text, total);
     }
+    learningGeometry_ = false;
 }
 
 void ManageContactsView::EmptyList(int page) {
@@ -483,6 +498,36 @@ void ManageContactsView::LoadPage(int page) {
         item->setText(kContactsColumnStorage, Q(row.storage));
         if (row.index > 0) item->setText(kContactsColumnIndex, QString::number(row.index));
     }
+    LogPage(page, rows);
+}
+
+// What a page lists, into the ui log: a line with the count, then one per row as shown.
+void ManageContactsView::LogPage(int page, const std::vector<Row>& rows) {
+    if (!context_.uiLog || !context_.uiLog->Enabled()) return;
+    const std::u16string title = PageTitle(page);
+    context_.uiLog->Line("contacts-list",
+                         title + u": " + Utf8ToUtf16(std::to_string(rows.size())) + u" rows");
+    for (const Row& row : rows) {
+        std::u16string line = title + u": " + row.name + u" <" + row.number + u">";
+        if (row.index > 0)
+            line += u" " + row.storage + u" " + Utf8ToUtf16(std::to_string(row.index));
+        context_.uiLog->Line("contacts-row", line);
+    }
+}
+
+void ManageContactsView::SelectEntry(int page, int index) {
+    QTreeWidget* list = List(page);
+    if (!list) return;
+    const QString wanted = QString::number(index);
+    for (int i = 0; i < list->topLevelItemCount(); ++i) {
+        QTreeWidgetItem* item = list->topLevelItem(i);
+        if (item->text(kContactsColumnIndex) != wanted) continue;
+        list->clearSelection();
+        list->setCurrentItem(item);
+        item->setSelected(true);
+        list->scrollToItem(item);
+        return;
+    }
 }
 
 std::vector<QTreeWidgetItem*> ManageContactsView::ChosenRows(int page) const {
@@ -507,7 +552,7 @@ ManageContactsView::Row ManageContactsView::RowOf(QTreeWidgetItem* item) const {
 }
 
 bool ManageContactsView::SimBooksReady() const {
-    return state_.sim == 2 && !SimCacheBuilding(*caches_);
+    return state_.sim == 2 && !learningGeometry_ && !SimCacheBuilding(*caches_);
 }
 
 bool ManageContactsView::RefuseWhileReading() {
@@ -669,6 +714,7 @@ void ManageContactsView::NewContact(int page) {
     }
     SimCacheAppend(caches_->sim, FileOfStorage(code), entry);
     LoadPage(page);
+    SelectEntry(page, entry.index);  // the new contact, where the sort put it
 }
 
 void ManageContactsView::EditContact(int page) {
@@ -690,6 +736,7 @@ void ManageContactsView::EditContact(int page) {
     }
     SimCacheReplace(caches_->sim, FileOfStorage(code), entry);
     LoadPage(page);
+    SelectEntry(page, entry.index);  // still the contact just edited
 }
 
 void ManageContactsView::CopyTo(int page, const std::string& target) {

@@ -106,8 +106,9 @@ class ManageContactsView : public View {
     void Find();
 
     const ContactsLoadState& LoadState() const { return state_; }
-    // The SIM Card and Card Phone lists are read whole and no build of their cache runs: only
-    // then is the free place New, Copy To and Import write to known.
+    // The SIM Card and Card Phone lists are read whole, their limits learnt, and no build of
+    // their cache runs: only then are the free place and the limits that New, Copy To and
+    // Import work with known.
     bool SimBooksReady() const;
     PhonebookCaches& Caches() { return *caches_; }
     void SetCardStateSource(std::function<int()> source) { cardState_ = std::move(source); }
@@ -143,6 +144,9 @@ class ManageContactsView : public View {
     bool RunContactDialog(ContactDialog& dialog, const StorageLimits& limits);
     // Says so and returns true while the SIM books are not ready.
     bool RefuseWhileReading();
+    void LogPage(int page, const std::vector<Row>& rows);
+    // Makes the row of entry index the current and only selected one of a SIM page.
+    void SelectEntry(int page, int index);
     void NewContact(int page);
     void EditContact(int page);
     void CopyTo(int page, const std::string& target);
@@ -165,6 +169,7 @@ class ManageContactsView : public View {
     std::function<int()> cardState_;
     std::function<std::string(bool)> vcardPath_;
     ContactsLoadState state_;
+    bool learningGeometry_ = false;
     QLineEdit* findEdit_ = nullptr;
     QPushButton* findButton_ = nullptr;
     ViewSet pages_;

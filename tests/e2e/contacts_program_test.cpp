@@ -1,6 +1,7 @@
 // Contacts through the real programs: vqm-dialer against vqm-cardsim, the phonebook caches built
 // at card-ready as the General page's settings ask, the address book read from a vCard folder,
-// and the Manage Contacts view's load when it is shown.
+// the Manage Contacts view's load when it is shown, and New, Edit, Copy To Card Phone and Delete
+// driven through the dialer's socket, checked on the card and on the DialPad of a ring.
 #include <gtest/gtest.h>
 
 #include <chrono>
@@ -37,8 +38,39 @@ class ContactsProgramTest : public ::testing::Test, protected testing::ProgramHo
         return WaitFor([&] { return Records(name, size) == count; }, 60s);
     }
 
+    // The simulated card's state file holds line within limit (or, with present false, no
+    // longer holds it): each phonebook entry is a line "pb SM 9 145 +4930123 Name".
+    bool CardHolds(const std::string& line, bool present = true) const {
+        return WaitFor(
+            [&] {
+                return (Read(temp_ / "state/card.state").find(line) != std::string::npos) ==
+                       present;
+            },
+            20s);
+    }
+    // The next New/Edit dialog is filled with name and number (no blanks in either).
+    void NextDialog(const std::string& name, const std::string& number) const {
+        std::ofstream(fields_) << "NEW_CONTACTS_DIALOG 1201=" << name << " 1202=" << number << "\n";
+    }
+    // A ring from number: the DialPad comes up with name, the caller gives up, and the pad is
+    // idle again (the operator back on its status line, after the result's two seconds).
+    void RingFrom(const std::string& number, const std::string& name) {
+        const size_t named = Count("status " + name), unanswered = Count("status Unanswered"),
+                     idle = Count("status COSMOTE");
+        ASSERT_EQ(Ctl("ring " + number).second, 0);
+        EXPECT_TRUE(LogShows("status " + name, 20s, named + 1)) << Log();
+        EXPECT_EQ(Ctl("caller-hangup").second, 0);
+        ASSERT_TRUE(LogShows("status Unanswered", 20s, unanswered + 1)) << Log();
+        ASSERT_TRUE(LogShows("status COSMOTE", 20s, idle + 1)) << Log();
+    }
+
     SettingsStore settings_{temp_ / "settings.db"};
+    const std::string fields_ = temp_ / "dialog-fields";
 };
+
+// Command ids: the Manage Contacts view, and its menu.
+constexpr int kShowContacts = 40004;
+constexpr int kNew = 40021, kEdit = 40015, kCopyToCard = 40011, kDelete = 40013;
 
 TEST_F(ContactsProgramTest, CardReadyRebuildsTheCachesTheGeneralPageAsksFor) {
     const int32_t on = 1;
@@ -77,6 +109,57 @@ TEST_F(ContactsProgramTest, ShowingManageContactsLoadsTheSimCache) {
     // The address-book cache lives only from a rebuild: showing the view cleared it.
     EXPECT_EQ(Records("phonebk1.db", 160), 0u);
     dialer_.Stop();
+}
+
+TEST_F(ContactsProgramTest, NewEditCopyAndDeleteReachTheCardAndNameACaller) {
+    ASSERT_NO_FATAL_FAILURE(
+        StartConnected("--powered", "--answer-boxes ok --dialog-fields " + fields_));
+    EXPECT_EQ(Command(kShowContacts, 10000), 0L);
+    ASSERT_TRUE(LogShows("contacts-list SIM Card: 8 rows", 60s)) << Log();
+    EXPECT_EQ(Count("contacts-row SIM Card: "), 8u) << Log();
+    EXPECT_TRUE(LogShows("contacts-row SIM Card: Alice Smith <+447700900123> SM 1")) << Log();
+    ASSERT_TRUE(LogShows("contacts-list Card Phone: 3 rows")) << Log();
+    // The limits are learnt from the card after the lists (the SIM's last).
+    ASSERT_TRUE(WaitFor(
+        [&] {
+            int32_t total = 0;
+            return GetSettingInt(settings_, u"sm_total", &total) && total == 250;
+        },
+        30s));
+
+    // New: into the SIM's first free place, on the card and in the list.
+    NextDialog("Zed", "+4930123");
+    EXPECT_EQ(Command(kNew, 10000), 0L);
+    EXPECT_TRUE(LogShows("dialog New Contacts: Name: | Number: -> OK")) << Log();
+    EXPECT_TRUE(CardHolds("pb SM 9 145 +4930123 Zed\n")) << Log();
+    EXPECT_TRUE(LogShows("contacts-row SIM Card: Zed <+4930123> SM 9")) << Log();
+    EXPECT_TRUE(LogShows("contacts-list SIM Card: 9 rows")) << Log();
+    // A call from the number just added rings with its name.
+    ASSERT_NO_FATAL_FAILURE(RingFrom("+4930123", "Zed"));
+
+    // Edit: the new contact is still the chosen row; it keeps its place.
+    EXPECT_EQ(Command(kShowContacts, 10000), 0L);
+    NextDialog("Zoe", "030123");
+    EXPECT_EQ(Command(kEdit, 10000), 0L);
+    EXPECT_TRUE(LogShows("dialog Edit Contacts: Name: | Number: -> OK")) << Log();
+    EXPECT_TRUE(CardHolds("pb SM 9 129 030123 Zoe\n")) << Log();
+    EXPECT_TRUE(CardHolds("+4930123", false)) << Log();
+    EXPECT_TRUE(LogShows("contacts-row SIM Card: Zoe <030123> SM 9")) << Log();
+
+    // Copy To Card Phone: behind the card memory's three.
+    EXPECT_EQ(Command(kCopyToCard, 10000), 0L);
+    EXPECT_TRUE(CardHolds("pb ME 4 129 030123 Zoe\n")) << Log();
+    EXPECT_TRUE(LogShows("contacts-list Card Phone: 4 rows")) << Log();
+    EXPECT_TRUE(LogShows("contacts-row Card Phone: Zoe <030123> ME 4")) << Log();
+
+    // Delete: the SIM's entry goes; the copy stays, and still names the caller.
+    EXPECT_EQ(Command(kDelete, 10000), 0L);
+    EXPECT_TRUE(CardHolds("pb SM 9 ", false)) << Log();
+    EXPECT_TRUE(CardHolds("pb ME 4 129 030123 Zoe\n")) << Log();
+    EXPECT_TRUE(LogShows("contacts-list SIM Card: 8 rows", 20s, 2)) << Log();
+    EXPECT_TRUE(CardHolds("pb SM 1 145 +447700900123 Alice Smith\n")) << Log();
+    ASSERT_NO_FATAL_FAILURE(RingFrom("030123", "Zoe"));
+    ExitDialer();
 }
 
 }  // namespace
