@@ -4,6 +4,7 @@
 #include <QApplication>
 #include <QComboBox>
 #include <QDialogButtonBox>
+#include <QEvent>
 #include <QGridLayout>
 #include <QLabel>
 #include <QLineEdit>
@@ -56,6 +57,24 @@ long TapControl(QWidget* subPage, QWidget* page, int id) {
     return 1;
 }
 
+namespace {
+
+// Runs its action whenever the watched widget changes size.
+class ResizeFollower : public QObject {
+  public:
+    ResizeFollower(QObject* parent, std::function<void()> action)
+        : QObject(parent), action_(std::move(action)) {}
+    bool eventFilter(QObject*, QEvent* event) override {
+        if (event->type() == QEvent::Resize) action_();
+        return false;
+    }
+
+  private:
+    std::function<void()> action_;
+};
+
+}  // namespace
+
 void CreateClassPages(View* page, ViewSet& pages, int tabId, const char* const pageClasses[3],
                       const std::function<void(View*, int)>& build, const char* buttonText,
                       int buttonId, int buttonHeight, const std::function<void()>& onClick) {
@@ -72,12 +91,29 @@ void CreateClassPages(View* page, ViewSet& pages, int tabId, const char* const p
         pages.records.push_back(std::move(record));
     }
     // The tabs take the page but for the button row below them.
-    const int buttonTop = page->height() - kMargin - buttonHeight;
-    CreateTabbedPages(page, tabId, pages, QRect(0, 0, page->width(), buttonTop - kMargin));
+    auto rectAbove = [page, buttonHeight] {
+        return QRect(0, 0, page->width(), page->height() - 2 * kMargin - buttonHeight);
+    };
+    CreateTabbedPages(page, tabId, pages, rectAbove());
     auto* all = new QPushButton(buttonText, page);
     SetControlId(all, buttonId);
-    all->setGeometry(kMargin, buttonTop, page->width() - 2 * kMargin, buttonHeight);
     QObject::connect(all, &QPushButton::clicked, page, onClick);
+    // The page is built at its parent's size and only then placed above the Settings view's
+    // own tab strip: the button row follows the page's bottom whenever its size changes.
+    auto place = [page, &pages, tabId, all, buttonHeight, rectAbove] {
+        QRect rect = rectAbove();
+        rect.setHeight(rect.height() - kMenuBarHeight);
+        if (QWidget* tabs = FindControl(page, tabId))
+            tabs->setGeometry(rect.left(), rect.bottom() + 1, rect.width(), kMenuBarHeight);
+        for (ViewRecord& record : pages.records) {
+            record.rect = rect;
+            if (record.window) record.window->setGeometry(rect);
+        }
+        all->setGeometry(kMargin, page->height() - kMargin - buttonHeight,
+                         page->width() - 2 * kMargin, buttonHeight);
+    };
+    place();
+    page->installEventFilter(new ResizeFollower(page, place));
 }
 
 void LogShown(ShellContext& context, const char* kind, const QString& text) {

@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include <stdlib.h>
+#include <QAbstractButton>
 #include <QApplication>
 #include <QCheckBox>
 #include <QComboBox>
@@ -641,6 +642,12 @@ TEST_P(SettingsPagesTest, ScreenshotOfEveryPage) {
         tabs->setCurrentIndex(i);
         QApplication::processEvents();
         const std::string name = tabs->tabText(i).toLower().replace(' ', '-').toStdString();
+        // Every button the page shows lies whole above the view's tab strip.
+        for (QAbstractButton* button : view.Page(i)->findChildren<QAbstractButton*>()) {
+            if (!button->isVisible()) continue;
+            const QRect shown(button->mapTo(&view, QPoint(0, 0)), button->size());
+            EXPECT_LE(shown.bottom(), tabs->y()) << name << ": " << button->text().toStdString();
+        }
         EXPECT_TRUE(view.grab().save(
             QString::fromStdString(folder + "/settings-" + name + "-" + dialect + ".png")));
     }
