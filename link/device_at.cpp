@@ -270,11 +270,16 @@ int GetCardIdentity(Link& link, char16_t* manufacturer, size_t manufacturerSize,
     return 1;
 }
 
-int GetSignalBars(Link& link, bool inTurn) {
+int GetSignalBars(Link& link) {
+    char reply[kReplySize];
+    const int length = static_cast<int>(PollCommand(link, "AT+CSQ\r", reply, sizeof reply));
+    return length == 0 ? -1 : ParseSignalReply(reply, length);
+}
+
+int GetSignalBarsInTurn(Link& link) {
     char reply[kReplySize];
     const int length = static_cast<int>(
-        inTurn ? AtCommandWithin(link, "AT+CSQ\r", reply, sizeof reply, kQueryAnswerLimitMs)
-               : PollCommand(link, "AT+CSQ\r", reply, sizeof reply));
+        AtCommandWithin(link, "AT+CSQ\r", reply, sizeof reply, kQueryAnswerLimitMs));
     return length == 0 ? -1 : ParseSignalReply(reply, length);
 }
 

@@ -76,8 +76,9 @@ float GetFirmwareVersion(Link& link, char16_t* text, size_t textSize);
 int GetCardIdentity(Link& link, char16_t* manufacturer, size_t manufacturerSize, char16_t* model,
                     size_t modelSize, char16_t* firmware, size_t firmwareSize);
 // "AT+CSQ": 0 to 4 bars, -1 when the port was busy or the card silent. As a poll it gives up
-// when the port is busy; inTurn waits for the port like any command.
-int GetSignalBars(Link& link, bool inTurn = false);
+// when the port is busy; the InTurn form waits for the port like any command.
+int GetSignalBars(Link& link);
+int GetSignalBarsInTurn(Link& link);
 // "AT+COPS?": 1 with the name in UTF-16, or 0.
 int GetOperatorName(Link& link, char16_t* name, size_t nameSize);
 // "AT+CLVL?" (not waiting for a busy port): the level, or -1.

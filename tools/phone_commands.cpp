@@ -309,7 +309,7 @@ Result Status(Context& context, bool json) {
     if (!GetCardIdentity(context.link, manufacturer, 64, model, 64, firmware, 64))
         return Fail(kExitRefused, "The card did not answer.");
     // Asked in turn: the dialer's own polls hold the port often.
-    const int bars = GetSignalBars(context.link, true);
+    const int bars = GetSignalBarsInTurn(context.link);
     const bool haveOperator = GetOperatorName(context.link, operatorName, 64);
     long power = -1;
     if (!context.companionPath.empty())

@@ -4,6 +4,7 @@
 
 #include <random>
 
+#include <atomic>
 #include <chrono>
 #include <cstring>
 #include <map>
@@ -17,6 +18,7 @@
 #include "link/link.h"
 #include "support/settings_store.h"
 #include "tests/common/temp_folder.h"
+#include "tests/common/wait.h"
 
 namespace vqm {
 namespace {
@@ -338,6 +340,18 @@ TEST_F(DeviceWrappersTest, CardDialect) {
     EXPECT_EQ(std::u16string(firmware), u"SW3.80");
     EXPECT_FLOAT_EQ(GetFirmwareVersion(*link_, nullptr, 0), 3.80f);
     EXPECT_EQ(Poll(GetSignalBars), 2);
+    // A poll gives way to whoever holds the port; the in-turn query waits for it.
+    ASSERT_EQ(PortLock(*link_), 1);
+    EXPECT_EQ(GetSignalBars(*link_), -1);
+    std::atomic<int> inTurn{-2};
+    std::thread asker([&] { inTurn = GetSignalBarsInTurn(*link_); });
+    ASSERT_TRUE(testing::WaitFor([&] {
+        std::lock_guard<std::mutex> lock(link_->portMutex);
+        return link_->nextTicket > link_->servingTicket;
+    }));
+    PortUnlock(*link_);
+    asker.join();
+    EXPECT_EQ(inTurn.load(), 2);
     char16_t name[32];
     EXPECT_EQ(GetOperatorName(*link_, name, 32), 1);
     EXPECT_EQ(std::u16string(name), u"PANAFON");
