@@ -125,6 +125,9 @@ long DialPad::OnMessage(unsigned msg, long wParam, long lParam) {
         case kMsgCallListEmpty:
             OnCallListEmpty();
             return 0;
+        case kMsgCallRinging:
+            OnCallRinging();
+            return 0;
         case kMsgPollRead:
             OnPollRead(static_cast<int>(wParam), lParam != 0);
             return 0;
@@ -341,18 +344,18 @@ void DialPad::HangUpLater() {
     });
 }
 
-void DialPad::OnEndKey() {
+void DialPad::OnEndKey(bool hangUp) {
     DialPadEmpty(number_);
     switch (callState_) {
         case kCallDialing:
             DialCancel();
             break;
         case kCallVoice:
-            HangUpLater();
+            if (hangUp) HangUpLater();
             EndWith(u"Call ended");
             break;
         case kCallRinging: {
-            HangUpLater();
+            if (hangUp) HangUpLater();
             EndWith(u"Unanswered");
             ui_.StopRingTone();
             char narrow[kCallLogNumberSize];
@@ -413,12 +416,19 @@ void DialPad::CallAnswered() {
 }
 
 void DialPad::OnCallListEmpty() {
-    if (callState_ == kCallVoice) {
-        OnEndKey();
-    } else if (callState_ == kCallRinging) {
-        NotifyUnansweredCall(*this);
-        OnEndKey();
-    }
+    // The call is over and nothing is left to hang up: a hang-up now would turn away a caller
+    // who rang since the list was read.
+    if (callState_ == kCallRinging) NotifyUnansweredCall(*this);
+    if (callState_ == kCallVoice || callState_ == kCallRinging) OnEndKey(/*hangUp=*/false);
+}
+
+// An answered call never rings again: the call talked on ended at the far end and a new
+// caller rang before the call list came up empty in between. The end is shown, then the ring
+// (whose own ring text came while the pad still talked, and was passed over then).
+void DialPad::OnCallRinging() {
+    if (callState_ != kCallVoice) return;
+    OnEndKey(/*hangUp=*/false);
+    OnIncomingCall(*this, EventRecord{});
 }
 
 void DialPad::OnTimer(int id) {

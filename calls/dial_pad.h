@@ -163,11 +163,13 @@ class DialPad {
     void OnCommand(int id);
     void OnKey(char16_t c);
     void OnCallKey();
-    void OnEndKey();
+    // hangUp false: the call list shows the call over already.
+    void OnEndKey(bool hangUp = true);
     void OnDialResult(int result);
     void OnCallActive();
     void CallAnswered();
     void OnCallListEmpty();
+    void OnCallRinging();
     void OnTimer(int id);
     void OnPollRead(int bars, bool named);
     void OnVolumeSet(int result, int level);

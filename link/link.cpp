@@ -359,7 +359,10 @@ void ListenerThread(Link* link) {
                 if (state == 0 && mode == 0) {
                     if (link->postToMain) link->postToMain(kMsgCallActive);
                     callSeen = true;
-                } else if (state == 4 && mode == 0 && !callSeen) {
+                } else if (state == 4 && mode == 0 && link->postToMain) {
+                    link->postToMain(kMsgCallRinging);
+                }
+                if (state == 4 && mode == 0 && !callSeen) {
                     // A call is ringing but no ring text arrived: act as if it had.
                     static const char kRing[] = "\r\n+CRING: VOICE\r\n\r\nOK\r\n";
                     if (link->events) {

@@ -25,6 +25,9 @@ inline constexpr int kMsgCallListEmpty = 2127;
 // seconds of silence with the listener's polls alone): the main window treats it as gone, as it
 // does a pulled card, and the card watch connects again once the card answers.
 inline constexpr int kMsgCardSilent = 2133;
+// The call list shows a single call ringing (sent on every pass that finds one): a DialPad that
+// still talks on a call learns that the call ended and a new caller rang between two passes.
+inline constexpr int kMsgCallRinging = 2134;
 inline constexpr int kUnansweredGone = 3;
 
 // Whether the modem echoes what it is sent, as the link has learnt it.

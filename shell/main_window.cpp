@@ -240,6 +240,7 @@ long MainWindow::OnMessage(unsigned msg, long wParam, long lParam) {
             return 0;
         case kMsgCallActive:
         case kMsgCallListEmpty:
+        case kMsgCallRinging:
             if (View* dialPad = ViewAt(kViewDialPad)) dialPad->OnMessage(msg, wParam, lParam);
             return 0;
         case kMsgCardSilent:

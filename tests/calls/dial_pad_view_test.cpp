@@ -329,6 +329,37 @@ TEST_P(DialPadCallTest, ACallAnsweredOnTheCardMovesToVoiceCallAndIsLogged) {
     EXPECT_TRUE(Logged(kCallLogUnanswered).empty());
 }
 
+// The far end hangs up and the next caller rings at once, before the listener's next look at
+// the call list: the call ends on the pad, and the new caller rings there and can be answered.
+TEST_P(DialPadCallTest, ACallerRingingAsTheFarEndHangsUpEndsTheCallAndRings) {
+    Start();
+    ASSERT_EQ(sim_->Control("ring 0555123"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return Ringing() && Text(kNumberDisplayId) == u"0555123"; }));
+    ASSERT_EQ(sim_->Control("local-answer"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return State() == kCallVoice; }));
+    ASSERT_EQ(sim_->Control("remote-hangup"), "OK");
+    ASSERT_EQ(sim_->Control("ring 0555777"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return Ringing() && Text(kNumberDisplayId) == u"0555777"; }));
+    Click(kKeyCallId);
+    ASSERT_TRUE(WaitFor([&] { return State() == kCallVoice; }));
+    EXPECT_NE(sim_->Control("status").find("call=active number=0555777"), std::string::npos);
+    EXPECT_EQ(Logged(kCallLogAnswered), (std::vector<std::string>{"0555123", "0555777"}));
+    EXPECT_TRUE(Logged(kCallLogUnanswered).empty());
+}
+
+// An empty call list ends a ring without a hang-up: here the card still rings (as for a caller
+// who rang again since the list was read), and the ring comes back on the pad.
+TEST_P(DialPadCallTest, AnEmptyCallListEndsARingWithoutHangingUpOnTheCard) {
+    Start();
+    ASSERT_EQ(sim_->Control("ring 0555123"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return Ringing() && Text(kNumberDisplayId) == u"0555123"; }));
+    window_->OnMessage(kMsgCallListEmpty, 0, 0);
+    EXPECT_EQ(Text(kStatusLine1Id), u"Unanswered");
+    EXPECT_EQ(Logged(kCallLogUnanswered), std::vector<std::string>{"0555123"});
+    EXPECT_TRUE(WaitFor([&] { return Ringing(); }));
+    EXPECT_NE(sim_->Control("status").find("call=incoming"), std::string::npos);
+}
+
 TEST_P(DialPadCallTest, ARingLeftUnansweredIsLoggedAndCounted) {
     // Old firmware sends the caller's number unquoted.
     Start("SW3.80");

@@ -290,7 +290,8 @@ TEST_F(LinkTest, QueriesReadTheirReplies) {
     };
     for (int i = 0; i < 9; ++i) {
         current = i;
-        EXPECT_EQ(poll(GetSignalBars), bars[i].second) << (bars[i].first ? bars[i].first : "none");
+        EXPECT_EQ(poll([](Link& l) { return GetSignalBars(l); }), bars[i].second)
+            << (bars[i].first ? bars[i].first : "none");
     }
     char16_t text[64];
     EXPECT_EQ(GetOperatorName(*link, text, 64), 1);
@@ -418,6 +419,34 @@ TEST_F(LinkTest, ListenerReportsActiveCallsAndOneEnd) {
     PortClose(*link);
     EXPECT_EQ(count(kMsgCallListEmpty), 1);
     EXPECT_FALSE(link->listener.joinable());
+}
+
+// A ringing call is reported on every pass, as an active one is: a DialPad still talking on
+// an earlier call learns from it that that call is over.
+TEST_F(LinkTest, ListenerReportsARingingCallOnEveryPass) {
+    FakeCard card([&](const std::string& command) {
+        return command == "AT+CLCC" ? Ok("+CLCC: 1,1,4,0,0,\"+441234\",145")
+                                    : StandardCard(command);
+    });
+    std::mutex m;
+    std::vector<int> posted;
+    auto link = std::make_unique<Link>(settings_, DriverRoots{folder_ + "/run", folder_ + "/tty"});
+    link->sleepMs = [](int ms) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(ms / 20 + 1));
+    };
+    link->postToMain = [&](int msg) {
+        std::lock_guard<std::mutex> lock(m);
+        posted.push_back(msg);
+    };
+    ASSERT_EQ(PortOpenDevice(*link, card.Device().c_str()), 1);
+    auto count = [&](int msg) {
+        std::lock_guard<std::mutex> lock(m);
+        return std::count(posted.begin(), posted.end(), msg);
+    };
+    EXPECT_TRUE(testing::WaitFor([&] { return count(kMsgCallRinging) >= 3; }));
+    PortClose(*link);
+    EXPECT_EQ(count(kMsgCallActive), 0);
+    EXPECT_EQ(count(kMsgCallListEmpty), 0);
 }
 
 TEST_F(LinkTest, ListenerRingsForAnIncomingCallWithoutRingText) {
