@@ -78,12 +78,8 @@ ContactPickerView::ContactPickerView(QWidget* parent, ShellContext& context,
     CreateTabbedPages(this, kPickerTabId, pages_, QRect(0, 0, width(), height()));
     if (View* outlook = pages_.records[2].window)
         CreateTabbedPages(outlook, kPickerOutlookTabId, outlookPages_, outlook->rect());
-    for (int id : {kPickerTabId, kPickerOutlookTabId}) {
-        if (auto* tabs = qobject_cast<QTabBar*>(FindControl(this, id))) {
-            tabs->setUsesScrollButtons(false);
-            tabs->setExpanding(true);
-        }
-    }
+    for (int id : {kPickerTabId, kPickerOutlookTabId})
+        FitTabTitles(this, id);
     ok_ = new QPushButton("OK", this);
     SetControlId(ok_, kPickerOkId);
     QObject::connect(ok_, &QPushButton::clicked, this, [this] { Ok(); });

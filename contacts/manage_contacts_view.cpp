@@ -202,13 +202,8 @@ ManageContactsView::ManageContactsView(QWidget* parent, ShellContext& context,
     CreateTabbedPages(this, kContactsTabId, pages_, QRect(0, 0, width(), height()));
     if (View* outlook = pages_.records[2].window)
         CreateTabbedPages(outlook, kContactsOutlookTabId, outlookPages_, outlook->rect());
-    // Three titles share a narrow strip: squeeze them in rather than scroll.
-    for (int id : {kContactsTabId, kContactsOutlookTabId}) {
-        if (auto* tabs = qobject_cast<QTabBar*>(FindControl(this, id))) {
-            tabs->setUsesScrollButtons(false);
-            tabs->setExpanding(true);
-        }
-    }
+    for (int id : {kContactsTabId, kContactsOutlookTabId})
+        FitTabTitles(this, id);
     Relayout();
     Messages();  // made on the view's thread, which owns it
 }

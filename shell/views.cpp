@@ -1,6 +1,7 @@
 #include "shell/views.h"
 
 #include <QAction>
+#include <QFont>
 #include <QTabBar>
 #include <QVariant>
 
@@ -94,6 +95,17 @@ int CreateTabbedPages(QWidget* parent, int tabId, ViewSet& set, QRect rect) {
                      [&set](int index) { SwitchView(set, index); });
     ShowView(set);
     return created;
+}
+
+void FitTabTitles(QWidget* parent, int tabId) {
+    auto* tabs = qobject_cast<QTabBar*>(FindControl(parent, tabId));
+    if (!tabs) return;
+    tabs->setUsesScrollButtons(false);
+    tabs->setExpanding(true);
+    // A point smaller than the pages' text: "SIM Card", "Card Phone" and "Outlook" then fit.
+    QFont font = tabs->font();
+    font.setPointSizeF(font.pointSizeF() - 1);
+    tabs->setFont(font);
 }
 
 void GetViewRect(const ViewSet& set, QRect* rect) {

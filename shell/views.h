@@ -69,6 +69,9 @@ void DisableViewButton(const ViewButtons& buttons, int index);
 // A tab strip 26 pixels high along the bottom of rect, one tab per record, and the pages
 // above it; tapping a tab switches pages. Returns the number of pages created.
 int CreateTabbedPages(QWidget* parent, int tabId, ViewSet& set, QRect rect);
+// Fits the titles of the tab strip tabId under parent into the strip's width, whole, rather
+// than scroll or cut the last (three titles share the 240-pixel screen).
+void FitTabTitles(QWidget* parent, int tabId);
 void GetViewRect(const ViewSet& set, QRect* rect);
 
 }  // namespace vqm
