@@ -1,11 +1,13 @@
 #include "shell/dialogs.h"
 
 #include <QAbstractButton>
+#include <QApplication>
 #include <QComboBox>
 #include <QDialog>
 #include <QLabel>
 #include <QLineEdit>
 #include <QMessageBox>
+#include <QThread>
 #include <cstdio>
 #include <fstream>
 #include <optional>
@@ -58,8 +60,12 @@ void Dialogs::Record(const DialogRequest& request, int answer) {
 
 int Dialogs::MessageBox(QWidget* parent, const std::u16string& text, const std::u16string& title,
                         unsigned style) {
-    const DialogRequest request{text, title, style, false, nullptr};
-    if (const auto answer = Answer(request)) return *answer;
+    DialogRequest request{text, title, style, false, nullptr};
+    // A box is a widget: it is made for the responder only where widgets may be.
+    const bool widgetsHere = qobject_cast<QApplication*>(QCoreApplication::instance()) &&
+                             QThread::currentThread() == QCoreApplication::instance()->thread();
+    if (!widgetsHere)
+        if (const auto answer = Answer(request)) return *answer;
     QMessageBox box(parent);
     // Texts may carry names, numbers and messages from outside: never read as markup.
     box.setTextFormat(Qt::PlainText);
@@ -113,6 +119,9 @@ int Dialogs::MessageBox(QWidget* parent, const std::u16string& text, const std::
     for (const Button& b : buttons)
         box.addButton(b.button);
     if (style & 0x40000) box.setWindowFlag(Qt::WindowStaysOnTopHint);
+    request.box = &box;
+    if (widgetsHere)
+        if (const auto answer = Answer(request)) return *answer;
     box.exec();
     int answer = kIdCancel;  // closed without a button
     for (const Button& b : buttons)

@@ -19,6 +19,9 @@ struct DialogRequest {
     unsigned style = 0;  // a box's style bits; 0 for dialogs
     bool isDialog = false;
     QDialog* dialog = nullptr;  // the dialog, built and ready, for a responder to look at
+    // A box as it would be shown (text, icon and buttons set, not shown yet), for a responder
+    // to look at as well: tests take pictures of the boxes the views really show.
+    QDialog* box = nullptr;
 };
 
 class Dialogs {

@@ -8,9 +8,9 @@
 
 #include <QAbstractButton>
 #include <QApplication>
+#include <QDialog>
 #include <QKeyEvent>
 #include <QLabel>
-#include <QMessageBox>
 #include <QTreeWidget>
 #include <chrono>
 #include <cstring>
@@ -46,6 +46,11 @@ class WriteSmsViewTest : public ::testing::TestWithParam<cardsim::Dialect> {
         SetSettingInt(settings_, u"SettingsMessagesUseSIMDefault", &simDefault);
         dialogs_.SetResponder([this](const DialogRequest& request) {
             boxes_.push_back(Utf16ToUtf8(request.title + u": " + request.text));
+            // The box the view shows, as a person would see it.
+            if (request.box && !boxShot_.empty()) {
+                SnapBox(request.box, boxShot_.c_str());
+                boxShot_.clear();
+            }
             return answer_;
         });
         caches_.pause = [](int) {};
@@ -90,10 +95,10 @@ class WriteSmsViewTest : public ::testing::TestWithParam<cardsim::Dialect> {
         ASSERT_NE(button, nullptr) << id;
         button->click();
     }
-    void Type(const std::u16string& text) {
+    void Type(const std::u16string& text, QWidget* into = nullptr) {
         for (char16_t c : text) {
             QKeyEvent press(QEvent::KeyPress, 0, Qt::NoModifier, QString(QChar(c)));
-            QApplication::sendEvent(write_->TextEdit(), &press);
+            QApplication::sendEvent(into ? into : write_->TextEdit(), &press);
         }
     }
     std::string Counter() {
@@ -129,13 +134,26 @@ class WriteSmsViewTest : public ::testing::TestWithParam<cardsim::Dialect> {
         }
         std::fclose(file);
     }
+    // A picture of widget in the build's screenshot folder, taken on one personality only:
+    // the two look the same.
     void Snap(QWidget* widget, const char* name) {
-        const char* dir = std::getenv("VQM_SCREENSHOTS");
-        if (!dir) return;  // screenshots only when asked for
+        if (GetParam() != cardsim::Dialect::Card) return;
         window_->show();
         QApplication::processEvents();
-        EXPECT_TRUE(
-            widget->grab().save(QString::fromStdString(std::string(dir) + "/" + name + ".png")));
+        Save(widget, name);
+    }
+    void SnapBox(QDialog* box, const char* name) {
+        if (GetParam() != cardsim::Dialect::Card) return;
+        box->show();  // a box sizes itself to its text when shown
+        QApplication::processEvents();
+        Save(box, name);
+        box->hide();
+    }
+    static void Save(QWidget* widget, const char* name) {
+        const std::string folder = VQM_SCREENSHOT_DIR;
+        std::filesystem::create_directories(folder);
+        EXPECT_TRUE(widget->grab().save(QString::fromStdString(folder + "/" + name + ".png")))
+            << name;
     }
 
     const testing::TempFolder temp_;
@@ -153,6 +171,7 @@ class WriteSmsViewTest : public ::testing::TestWithParam<cardsim::Dialect> {
     SmsFolderView* folder_ = nullptr;
     std::vector<std::string> boxes_;
     int answer_ = kIdOk;
+    std::string boxShot_;  // the name of a picture to take of the next box
 };
 
 TEST_P(WriteSmsViewTest, CounterFollowsTypingAndTheLimitStopsOnlyKeys) {
@@ -205,6 +224,7 @@ TEST_P(WriteSmsViewTest, TheLengthQuestionCutsOrKeeps) {
     write_->SetRecipients(u"12345");
     write_->SetText(std::u16string(161, u'z'));
     answer_ = kIdCancel;
+    boxShot_ = "write-length-question";
     Click(write_, kWriteSendId);
     EXPECT_FALSE(write_->Sending());
     EXPECT_EQ(boxes_, std::vector<std::string>{"Error: Short message length exceeded, only first "
@@ -263,13 +283,37 @@ TEST_P(WriteSmsViewTest, RequestsFromOtherViewsLandInTheFields) {
     // No window: nowhere to hand it.
     ShellContext bare{settings_, link_, dialogs_, temp_ / "run"};
     EXPECT_EQ(HandToWriteSms(bare, ReplyRequest(u"A<1>;\r\n")), 0);
+}
 
-    if (std::getenv("VQM_SCREENSHOTS")) {
-        QMessageBox box(QMessageBox::Critical, "Error",
-                        QString::fromStdU16String(kLengthGsmQuestion),
-                        QMessageBox::Ok | QMessageBox::Cancel, write_);
-        Snap(&box, "write-length-question");
-    }
+// What a send reads of the recipients is all that can be typed; entries added from elsewhere
+// beyond it stay, and Send then refuses, naming the entry the limit would cut, sending nothing.
+TEST_P(WriteSmsViewTest, RecipientsBeyondWhatIsReadAreNeverCutShort) {
+    QWidget* field = write_->RecipientsEdit();
+    Type(std::u16string(250, u'1') + u";Bob<+447700900456>", field);
+    EXPECT_EQ(write_->Recipients().size(), kRecipientsReadLimit);  // the rest was refused
+    Click(write_, kWriteClearId);
+
+    std::u16string many;  // 12 entries of 22 characters
+    for (int i = 10; i < 22; ++i)
+        many +=
+            Utf8ToUtf16("Pal" + std::to_string(i) + "<+4477009000" + std::to_string(i) + ">;\r\n");
+    write_->SetRecipients(many);
+    Type(u"Hello");
+    boxShot_ = "write-recipients-too-long";
+    Click(write_, kWriteSendId);
+    EXPECT_FALSE(write_->Sending());
+    EXPECT_EQ(boxes_, std::vector<std::string>{Utf16ToUtf8(
+                          u"Error: " + RecipientsTooLongText(u"Pal21<+447700900021>"))});
+    EXPECT_TRUE(Local().empty());
+    EXPECT_EQ(write_->Recipients().size(), many.size() - 12);  // left as it was, less the "\r"s
+
+    // With room made, the first two go out.
+    boxes_.clear();
+    write_->SetRecipients(many.substr(0, 2 * 23));
+    SendAndWait();
+    EXPECT_EQ(boxes_, std::vector<std::string>{"VQM Dialer: Message has been sent."});
+    ASSERT_EQ(Local().size(), 2u);
+    EXPECT_STREQ(Local()[1].number, "+447700900011");
 }
 
 INSTANTIATE_TEST_SUITE_P(BothPersonalities, WriteSmsViewTest,

@@ -134,6 +134,19 @@ TEST_F(HostileTextTest, EveryPlaceShowsOutsideTextAsPlainText) {
              people.MessageBox(window_.get(), kHostile, u"VQM Dialer", 0);
              return shown;
          }},
+        {"message box a script answers",
+         [&] {
+             // The responder is handed the box as it would be shown, so its pictures are true.
+             Dialogs scripted;
+             Shown shown;
+             scripted.SetResponder([&](const DialogRequest& request) {
+                 if (auto* box = qobject_cast<QMessageBox*>(request.box))
+                     shown.emplace_back(box->textFormat(), box->text());
+                 return kIdOk;
+             });
+             EXPECT_EQ(scripted.MessageBox(window_.get(), kHostile, u"VQM Dialer", 0), kIdOk);
+             return shown;
+         }},
     };
     for (const auto& place : places) {
         SCOPED_TRACE(place.place);
@@ -160,7 +173,9 @@ TEST_F(HostileTextTest, UiLogKeepsOutsideTextOnItsOwnLineAndLiteral) {
     } cases[] = {
         {kHostile, "<b>x</b><img src=\"file:///etc/passwd\"> &lt;<i>y"},
         {u"Alice\r\n1700000000.000 card 2 connected", "Alice / 1700000000.000 card 2 connected"},
-        {u"\x1b[2J\x07" u"Bob\x7f", "\\x1b[2J\\x07Bob\\x7f"},
+        {u"\x1b[2J\x07"
+         u"Bob\x7f",
+         "\\x1b[2J\\x07Bob\\x7f"},
     };
     for (const auto& c : cases)
         uiLog_.Line("status", c.text);
