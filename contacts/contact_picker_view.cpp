@@ -11,6 +11,7 @@
 #include <QVBoxLayout>
 #include <algorithm>
 
+#include "contacts/contact_pages_view.h"
 #include "link/link.h"
 #include "shell/messages.h"
 
@@ -18,16 +19,6 @@ namespace vqm {
 
 namespace {
 
-struct PageName {
-    const char16_t* title;
-    const char* className;
-};
-constexpr PageName kTopPages[3] = {{u"SIM Card", "CONTACTS_SIM_PAGE"},
-                                   {u"Card Phone", "CONTACTS_CARD_PAGE"},
-                                   {u"Outlook", "CONTACTS_OUTLOOK_PAGE"}};
-constexpr PageName kOutlookPages[3] = {{u"Mobile", "CONTACTS_OUTLOOK_MOBILE_PAGE"},
-                                       {u"Home", "CONTACTS_OUTLOOK_HOME_PAGE"},
-                                       {u"Work", "CONTACTS_OUTLOOK_WORK_PAGE"}};
 constexpr int kButtonWidth = 55, kButtonHeight = 26;
 
 QString Q(const std::u16string& text) {
@@ -49,37 +40,8 @@ ContactPickerView::ContactPickerView(QWidget* parent, ShellContext& context,
     else
         resize(240, 320 - kMenuBarHeight);
 
-    for (int i = 0; i < 3; ++i) {
-        ViewRecord record;
-        record.caption = kTopPages[i].title;
-        record.className = kTopPages[i].className;
-        record.windowProc = [this, i](QWidget* pageParent) -> View* {
-            auto* page = new View(pageParent);
-            if (i < 2) {
-                lists_[i] = MakeList(page, i);
-                return page;
-            }
-            // Outlook holds its three pages under a tab strip of its own.
-            for (int j = 0; j < 3; ++j) {
-                ViewRecord inner;
-                inner.caption = kOutlookPages[j].title;
-                inner.className = kOutlookPages[j].className;
-                inner.windowProc = [this, j](QWidget* innerParent) -> View* {
-                    auto* innerPage = new View(innerParent);
-                    lists_[kPickerMobilePage + j] = MakeList(innerPage, kPickerMobilePage + j);
-                    return innerPage;
-                };
-                outlookPages_.records.push_back(std::move(inner));
-            }
-            return page;
-        };
-        pages_.records.push_back(std::move(record));
-    }
-    CreateTabbedPages(this, kPickerTabId, pages_, QRect(0, 0, width(), height()));
-    if (View* outlook = pages_.records[2].window)
-        CreateTabbedPages(outlook, kPickerOutlookTabId, outlookPages_, outlook->rect());
-    for (int id : {kPickerTabId, kPickerOutlookTabId})
-        FitTabTitles(this, id);
+    CreateContactPages(this, "CONTACTS", kPickerTabId, kPickerOutlookTabId, pages_, outlookPages_,
+                       [this](QWidget* page, int n) { lists_[n] = MakeList(page, n); });
     ok_ = new QPushButton("OK", this);
     SetControlId(ok_, kPickerOkId);
     QObject::connect(ok_, &QPushButton::clicked, this, [this] { Ok(); });

@@ -20,6 +20,7 @@
 #include <sstream>
 #include <vector>
 
+#include "contacts/contact_pages_view.h"
 #include "contacts/phonebook_at.h"
 #include "link/link.h"
 #include "shell/dialogs.h"
@@ -37,26 +38,6 @@ constexpr unsigned kMbIconStop = 0x10;
 // The builder's one message to a person, moved to the view's thread.
 constexpr unsigned kMsgShowAddressBookBox = 0x8101;
 constexpr int kFindRowHeight = 20;
-
-struct PageInfo {
-    const char16_t* title;
-    const char* className;
-};
-constexpr PageInfo kTopPages[3] = {
-    {u"SIM Card", "MANAGECONTACTS_SIM_PAGE"},
-    {u"Card Phone", "MANAGECONTACTS_CARD_PAGE"},
-    {u"Outlook", "MANAGECONTACTS_OUTLOOK_PAGE"},
-};
-constexpr PageInfo kOutlookPages[3] = {
-    {u"Mobile", "MANAGECONTACTS_OUTLOOK_MOBILE_PAGE"},
-    {u"Home", "MANAGECONTACTS_OUTLOOK_HOME_PAGE"},
-    {u"Work", "MANAGECONTACTS_OUTLOOK_WORK_PAGE"},
-};
-
-std::u16string PageTitle(int page) {
-    if (page >= kContactsMobilePage) return kOutlookPages[page - kContactsMobilePage].title;
-    return kTopPages[page].title;
-}
 
 bool IsSimPage(int page) {
     return page == kContactsSimPage || page == kContactsCardPage;
@@ -173,37 +154,9 @@ ManageContactsView::ManageContactsView(QWidget* parent, ShellContext& context,
     QObject::connect(findButton_, &QPushButton::clicked, this, [this] { Find(); });
     QObject::connect(findEdit_, &QLineEdit::returnPressed, this, [this] { Find(); });
 
-    for (int i = 0; i < 3; ++i) {
-        ViewRecord record;
-        record.caption = kTopPages[i].title;
-        record.className = kTopPages[i].className;
-        record.windowProc = [this, i](QWidget* pageParent) -> View* {
-            auto* page = new View(pageParent);
-            if (i < 2) {
-                lists_[i] = MakeList(page, i);
-                return page;
-            }
-            // Outlook holds its three pages under a tab strip of its own.
-            for (int j = 0; j < 3; ++j) {
-                ViewRecord inner;
-                inner.caption = kOutlookPages[j].title;
-                inner.className = kOutlookPages[j].className;
-                inner.windowProc = [this, j](QWidget* innerParent) -> View* {
-                    auto* innerPage = new View(innerParent);
-                    lists_[kContactsMobilePage + j] = MakeList(innerPage, kContactsMobilePage + j);
-                    return innerPage;
-                };
-                outlookPages_.records.push_back(std::move(inner));
-            }
-            return page;
-        };
-        pages_.records.push_back(std::move(record));
-    }
-    CreateTabbedPages(this, kContactsTabId, pages_, QRect(0, 0, width(), height()));
-    if (View* outlook = pages_.records[2].window)
-        CreateTabbedPages(outlook, kContactsOutlookTabId, outlookPages_, outlook->rect());
-    for (int id : {kContactsTabId, kContactsOutlookTabId})
-        FitTabTitles(this, id);
+    CreateContactPages(this, "MANAGECONTACTS", kContactsTabId, kContactsOutlookTabId, pages_,
+                       outlookPages_,
+                       [this](QWidget* page, int n) { lists_[n] = MakeList(page, n); });
     Relayout();
     Messages();  // made on the view's thread, which owns it
 }
@@ -499,7 +452,7 @@ void ManageContactsView::LoadPage(int page) {
 // What a page lists, into the ui log: a line with the count, then one per row as shown.
 void ManageContactsView::LogPage(int page, const std::vector<Row>& rows) {
     if (!context_.uiLog || !context_.uiLog->Enabled()) return;
-    const std::u16string title = PageTitle(page);
+    const std::u16string title = ContactPageTitle(page);
     context_.uiLog->Line("contacts-list",
                          title + u": " + Utf8ToUtf16(std::to_string(rows.size())) + u" rows");
     for (const Row& row : rows) {
