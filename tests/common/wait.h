@@ -13,9 +13,11 @@
 
 namespace vqm::testing {
 
+// The default limit is far above any honest wait, which ends as soon as its condition holds:
+// CI runs two tests a core, under sanitizers, and a card's reply can then take seconds.
 template <typename Condition>
 bool WaitFor(Condition condition,
-             std::chrono::milliseconds limit = std::chrono::milliseconds(5000)) {
+             std::chrono::milliseconds limit = std::chrono::milliseconds(15000)) {
     const auto end = std::chrono::steady_clock::now() + limit;
     while (!condition()) {
         if (std::chrono::steady_clock::now() > end) return false;

@@ -21,8 +21,9 @@
 #include "contacts/phonebook_at.h"
 #include "link/link.h"
 #include "support/settings_store.h"
+#include "tests/common/fake_card.h"
+#include "tests/common/link_waits.h"
 #include "tests/common/temp_folder.h"
-#include "tests/link/fake_card.h"
 
 namespace vqm {
 namespace {
@@ -84,9 +85,7 @@ class CacheBuildersTest : public ::testing::Test {
 
     std::unique_ptr<Link> MakeLink() {
         auto link = std::make_unique<Link>(settings_, DriverRoots{temp_ / "run", temp_ / "tty"});
-        link->sleepMs = [](int ms) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(ms / 10));
-        };
+        testing::ShortenLinkWaits(*link);
         return link;
     }
     void OpenScripted() { ASSERT_EQ(PortOpenDevice(*link_, card_.Device().c_str()), 1); }

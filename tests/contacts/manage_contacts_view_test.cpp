@@ -32,6 +32,7 @@
 #include "shell/messages.h"
 #include "support/settings_store.h"
 #include "support/text.h"
+#include "tests/common/link_waits.h"
 #include "tests/common/temp_folder.h"
 #include "tests/common/wait.h"
 
@@ -69,9 +70,7 @@ class ManageContactsViewTest : public ::testing::Test {
         config.stateFile = temp_ / "card.state";
         sim_ = std::make_unique<cardsim::CardSim>(config);
         EXPECT_TRUE(sim_->PowerUp());
-        link_.sleepMs = [](int ms) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(ms / 10));
-        };
+        testing::ShortenLinkWaits(link_);
         EXPECT_EQ(PortOpenDevice(link_, sim_->DevicePath().c_str()), 1);
         dialogs_.SetResponder([this](const DialogRequest& request) {
             if (!request.isDialog) {

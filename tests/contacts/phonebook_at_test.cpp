@@ -18,8 +18,9 @@
 #include "cardsim/card_sim.h"
 #include "link/link.h"
 #include "support/settings_store.h"
+#include "tests/common/fake_card.h"
+#include "tests/common/link_waits.h"
 #include "tests/common/temp_folder.h"
-#include "tests/link/fake_card.h"
 
 namespace vqm {
 namespace {
@@ -53,7 +54,7 @@ PhonebookEntry MakeEntry(int index, const std::string& number, int type, const s
 std::unique_ptr<Link> MakeLink(SettingsStore& settings, const TempFolder& temp) {
     auto link = std::make_unique<Link>(settings, DriverRoots{temp / "run", temp / "tty"});
     // The first-byte wait shortened; the 200 ms silence that ends a reply stays as it is.
-    link->sleepMs = [](int ms) { std::this_thread::sleep_for(std::chrono::milliseconds(ms / 10)); };
+    testing::ShortenLinkWaits(*link);
     return link;
 }
 

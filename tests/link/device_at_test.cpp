@@ -14,9 +14,10 @@
 #include <thread>
 #include <vector>
 
-#include "fake_card.h"
 #include "link/link.h"
 #include "support/settings_store.h"
+#include "tests/common/fake_card.h"
+#include "tests/common/link_waits.h"
 #include "tests/common/temp_folder.h"
 #include "tests/common/wait.h"
 
@@ -296,9 +297,7 @@ class DeviceWrappersTest : public ::testing::Test {
             return found != replies_.end() ? found->second : Ok();
         });
         link_ = std::make_unique<Link>(settings_, DriverRoots{folder_ + "/run", folder_ + "/tty"});
-        link_->sleepMs = [](int ms) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(ms / 10));
-        };
+        testing::ShortenLinkWaits(*link_);
         ASSERT_EQ(PortOpenDevice(*link_, card_->Device().c_str()), 1);
     }
     void TearDown() override {

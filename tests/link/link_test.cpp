@@ -13,9 +13,10 @@
 #include <thread>
 #include <vector>
 
-#include "fake_card.h"
 #include "link/operators.h"
 #include "support/settings_store.h"
+#include "tests/common/fake_card.h"
+#include "tests/common/link_waits.h"
 #include "tests/common/temp_folder.h"
 #include "tests/common/wait.h"
 
@@ -85,9 +86,7 @@ class LinkTest : public ::testing::Test {
     std::unique_ptr<Link> OpenLink(FakeCard& card) {
         auto link =
             std::make_unique<Link>(settings_, DriverRoots{folder_ + "/run", folder_ + "/tty"});
-        link->sleepMs = [](int ms) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(ms / 10));
-        };
+        testing::ShortenLinkWaits(*link);
         link->events = &sink_;
         sink_.link = link.get();
         EXPECT_EQ(PortOpenDevice(*link, card.Device().c_str()), 1);

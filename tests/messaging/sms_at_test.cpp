@@ -16,8 +16,8 @@
 #include "messaging/sms_at.h"
 #include "support/gsm.h"
 #include "support/settings_store.h"
+#include "tests/common/fake_card.h"
 #include "tests/common/temp_folder.h"
-#include "tests/link/fake_card.h"
 
 namespace vqm {
 namespace {

@@ -14,6 +14,7 @@
 #include "settings/network_at.h"
 #include "settings/security_at.h"
 #include "support/settings_store.h"
+#include "tests/common/link_waits.h"
 #include "tests/common/temp_folder.h"
 
 namespace vqm {
@@ -33,9 +34,7 @@ class SettingsCardTest : public ::testing::Test {
         auto sim = std::make_unique<CardSim>(config);
         EXPECT_TRUE(sim->PowerUp());
         link_ = std::make_unique<Link>(settings_, DriverRoots{temp_ / "run", temp_ / "tty"});
-        link_->sleepMs = [](int ms) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(ms / 10));
-        };
+        testing::ShortenLinkWaits(*link_);
         EXPECT_EQ(PortOpenDevice(*link_, sim->DevicePath().c_str()), 1);
         return sim;
     }

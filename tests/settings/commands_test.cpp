@@ -19,8 +19,9 @@
 #include "settings/network_at.h"
 #include "settings/security_at.h"
 #include "support/settings_store.h"
+#include "tests/common/fake_card.h"
+#include "tests/common/link_waits.h"
 #include "tests/common/temp_folder.h"
-#include "tests/link/fake_card.h"
 
 namespace vqm {
 namespace {
@@ -43,9 +44,7 @@ class CommandsTest : public ::testing::Test {
               return reply == replies_.end() ? kOk : reply->second;
           }) {
         link_ = std::make_unique<Link>(settings_, DriverRoots{temp_ / "run", temp_ / "tty"});
-        link_->sleepMs = [](int ms) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(ms / 10));
-        };
+        testing::ShortenLinkWaits(*link_);
         EXPECT_EQ(PortOpenDevice(*link_, card_.Device().c_str()), 1);
         Sent();  // the initialisation is not under test
     }

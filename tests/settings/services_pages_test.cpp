@@ -34,6 +34,7 @@
 #include "shell/dialogs.h"
 #include "shell/messages.h"
 #include "support/settings_store.h"
+#include "tests/common/link_waits.h"
 #include "tests/common/temp_folder.h"
 
 namespace vqm {
@@ -62,9 +63,7 @@ class ServicesPagesTest : public ::testing::TestWithParam<Dialect> {
         config.engine.dialect = GetParam();
         sim_ = std::make_unique<cardsim::CardSim>(config);
         EXPECT_TRUE(sim_->PowerUp());
-        link_.sleepMs = [](int ms) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(ms / 10));
-        };
+        testing::ShortenLinkWaits(link_);
         EXPECT_EQ(PortOpenDevice(link_, sim_->DevicePath().c_str()), 1);
         dialogs_.SetResponder([this](const DialogRequest& request) {
             if (!request.isDialog) {

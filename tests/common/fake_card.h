@@ -1,5 +1,5 @@
-// A scripted card on a pseudo-terminal for the link's tests: echoes what it is sent and
-// answers each command line with whatever the test's responder returns.
+// A scripted card on a pseudo-terminal for the tests of the link and the AT wrappers: echoes what
+// it is sent and answers each command line with whatever the test's responder returns.
 #pragma once
 
 #include <fcntl.h>
