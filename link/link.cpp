@@ -29,7 +29,6 @@ namespace {
 constexpr int kMutexWaitMs = 5000;
 constexpr int kReadTimeoutMs = 200;  // a one-byte read waits at most this long
 constexpr int kAnswerPollMs = 100;   // the wait between looks for the first reply byte
-constexpr int kInitAnswerLimitMs = 1000;
 constexpr int kInterByteMs = 20;  // the bytes of one line follow each other closer
 
 const char kInitCommands[7][32] = {
@@ -561,8 +560,8 @@ int ModemInit(Link& link) {
     for (const char* command : kInitCommands) {
         char reply[256];
         // A card that does not answer its start-up is not waited for: the watch tries again.
-        // Any card answers these at once; the window waits meanwhile, so the wait is short.
-        if (AtCommandWithin(link, command, reply, sizeof reply, kInitAnswerLimitMs) == 0) return 0;
+        // The limit is any query's: a card on a loaded machine may take more than a second.
+        if (AtCommandWithin(link, command, reply, sizeof reply, kQueryAnswerLimitMs) == 0) return 0;
     }
     return 1;
 }
