@@ -32,11 +32,10 @@
 #include "support/text.h"
 #include "tests/common/sim_card_host.h"
 #include "tests/common/temp_folder.h"
+#include "tests/common/wait.h"
 
 namespace vqm {
 namespace {
-
-using std::chrono::milliseconds;
 
 // A pseudo-terminal the dialer opens as its card, joined byte for byte to the simulated card's
 // own device; what the dialer writes is kept.
@@ -205,14 +204,7 @@ class WriteSmsProgramTest : public ::testing::TestWithParam<cardsim::Dialect> {
     void Close() {
         host_.CloseLink();
         window_.reset();
-    }
-    bool WaitFor(const std::function<bool()>& done, int limitMs = 20000) {
-        const auto until = std::chrono::steady_clock::now() + milliseconds(limitMs);
-        while (!done() && std::chrono::steady_clock::now() < until) {
-            QApplication::processEvents(QEventLoop::AllEvents, 20);
-            std::this_thread::sleep_for(milliseconds(2));
-        }
-        return done();
+        host_.messages = nullptr;  // the window's message layer went with it
     }
     void Click(int id) {
         auto* button = qobject_cast<QAbstractButton*>(FindControl(write_, id));
@@ -223,7 +215,7 @@ class WriteSmsProgramTest : public ::testing::TestWithParam<cardsim::Dialect> {
         write_->SetRecipients(recipients);
         write_->SetText(text);
         Click(kWriteSendId);
-        ASSERT_TRUE(WaitFor([&] { return !write_->Sending(); }));
+        ASSERT_TRUE(testing::WaitPumping([&] { return !write_->Sending(); }));
     }
     std::vector<std::u16string> Column(int page, int column) {
         std::vector<std::u16string> texts;
