@@ -89,9 +89,12 @@ int CallerIdNumber(const EventRecord& record, float firmwareVersion, char* numbe
     return ParseCallerIdLine(record.text, record.length, firmwareVersion, number, numberSize);
 }
 
-int OnIncomingCall(DialPad& pad, const EventRecord&) {
+int OnIncomingCall(DialPad& pad, const EventRecord& record) {
     // A call being dialled or talked on keeps the pad: this dialer does not take a second one.
     if (pad.CallState() == kCallDialing || pad.CallState() == kCallVoice) return 0;
+    // A repeat of the ring turned down here, handed over late, must not ring again (and log
+    // its caller a second time).
+    if (pad.RingOfAHungUpCall(record.time)) return 0;
     DialPadUi& ui = pad.Ui();
     // The card repeats the ring every few seconds: a repeat leaves the caller's name and
     // number standing instead of blanking them until the next caller id.

@@ -336,12 +336,28 @@ void DialPad::OnAnswerResult(int result) {
     }
 }
 
+namespace {
+// A moment as one number that orders like the moment.
+uint64_t OrderOf(const SystemTime& t) {
+    return ((((static_cast<uint64_t>(t.year) * 13 + t.month) * 32 + t.day) * 24 + t.hour) * 60 +
+            t.minute) *
+               60000 +
+           t.second * 1000u + t.milliseconds;
+}
+}  // namespace
+
 void DialPad::HangUpLater() {
     ++hangUpsPending_;
     worker_.Post([this] {
         HangUp(link_);
         --hangUpsPending_;
     });
+}
+
+bool DialPad::RingOfAHungUpCall(const SystemTime& readAt) const {
+    if (hangUpsPending_.load() > 0) return true;
+    // A ring the pad makes up itself (no time) is of the call the list shows now.
+    return readAt.year != 0 && OrderOf(readAt) <= rejectedAt_;
 }
 
 void DialPad::OnEndKey(bool hangUp) {
@@ -355,7 +371,10 @@ void DialPad::OnEndKey(bool hangUp) {
             EndWith(u"Call ended");
             break;
         case kCallRinging: {
-            if (hangUp) HangUpLater();
+            if (hangUp) {
+                rejectedAt_ = OrderOf(ToSystemTimeUtc(std::chrono::system_clock::now()));
+                HangUpLater();
+            }
             EndWith(u"Unanswered");
             ui_.StopRingTone();
             char narrow[kCallLogNumberSize];

@@ -142,6 +142,9 @@ class DialPad {
     int CallState() const { return callState_; }
     // Becomes the ringing state; a ring that starts a new call forgets the last caller.
     void EnterRinging();
+    // A ring read at readAt belongs to a call this pad hung up: read before End turned the
+    // caller down, or handed over while the hang-up is still on its way. Not a new caller.
+    bool RingOfAHungUpCall(const SystemTime& readAt) const;
     // The number the ringing call's caller id showed, empty until one came.
     std::u16string& RingingCaller() { return ringingCaller_; }
     void RefreshNumberDisplay();
@@ -221,6 +224,7 @@ class DialPad {
     // Hang-ups handed to the worker and not yet done: meanwhile the card may still list the
     // call, which is not a call to show again.
     std::atomic<int> hangUpsPending_{0};
+    uint64_t rejectedAt_ = 0;     // when End last turned a caller down (OrderOf)
     bool initialVolume_ = false;  // the volume set at connection, whose refusal greys the slider
     std::mutex polledMutex_;
     std::u16string polledOperator_;

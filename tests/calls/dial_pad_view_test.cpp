@@ -360,6 +360,30 @@ TEST_P(DialPadCallTest, AnEmptyCallListEndsARingWithoutHangingUpOnTheCard) {
     EXPECT_NE(sim_->Control("status").find("call=incoming"), std::string::npos);
 }
 
+// A caller turned down with End: a repeat of its ring read before End (handed over late, as
+// the event queue waits for the port) does not ring again nor log the caller twice; a ring
+// read after the hang-up is a new call.
+TEST_P(DialPadCallTest, ARingReadBeforeTheRejectDoesNotRingAgain) {
+    Start();
+    ASSERT_EQ(sim_->Control("ring 0555123"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return Ringing() && Text(kNumberDisplayId) == u"0555123"; }));
+    const auto readBefore = std::chrono::system_clock::now();
+    Click(kKeyEndId);
+    ASSERT_TRUE(CardIdle());
+    static const char kRing[] = "+CRING: VOICE";
+    const char* end = kRing + sizeof kRing - 1;
+    OnIncomingCall(pad_->Pad(), MakeEventRecord(kEventRing, kRing, end, readBefore));
+    EXPECT_EQ(State(), kCallEnded);
+    EXPECT_EQ(Text(kStatusLine1Id), u"Unanswered");
+    EXPECT_EQ(Logged(kCallLogUnanswered), std::vector<std::string>{"0555123"});
+    // (Once the hang-up's exchange has ended: the card takes it just before.)
+    EXPECT_TRUE(WaitFor([&] {
+        OnIncomingCall(pad_->Pad(),
+                       MakeEventRecord(kEventRing, kRing, end, std::chrono::system_clock::now()));
+        return Ringing();
+    }));
+}
+
 TEST_P(DialPadCallTest, ARingLeftUnansweredIsLoggedAndCounted) {
     // Old firmware sends the caller's number unquoted.
     Start("SW3.80");
