@@ -204,7 +204,10 @@ AddressBookResult ParseVCards(const std::string& text) {
     AddressBookResult result;
     result.opened = true;
     result.source = AddressBookSource::VCardFolder;
-    for (const std::string& card : SplitCards(text)) {
+    for (std::string& card : SplitCards(text)) {
+        // EDS takes the card as a C string: a NUL byte would end it early, and a quoted-printable
+        // '=' or an escape just before that end sends EDS's parser past its copy of the card.
+        card.erase(std::remove(card.begin(), card.end(), '\0'), card.end());
         void* contact = api.contactNewFromVcard(card.c_str());
         if (!contact) continue;
         result.contacts.push_back(FromEContact(api, contact));

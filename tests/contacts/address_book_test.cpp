@@ -1,6 +1,6 @@
 // The desktop address book's vCard side, through EDS's own parser and writer: which vCard
-// telephone types become which numbers, a folder of files good and bad, ten thousand contacts,
-// and phonebook entries out to vCards and back.
+// telephone types become which numbers, a folder of files good and bad, NUL bytes inside a card,
+// ten thousand contacts, and phonebook entries out to vCards and back.
 #include "contacts/address_book.h"
 
 #include <gtest/gtest.h>
@@ -73,6 +73,34 @@ TEST_F(AddressBookTest, AFolderOfFilesGoodAndBad) {
     const AddressBookResult none = ReadVCardFolder(temp_ / "no-such-folder");
     EXPECT_TRUE(none.opened);
     EXPECT_TRUE(none.contacts.empty());
+}
+
+// EDS reads each card as a C string. A NUL byte in a file used to end the card there, and where
+// a quoted-printable '=' or an escape stood just before it, EDS's parser stepped past the end of
+// its copy (the fuzz target's heap overflow); the card must reach EDS whole, up to END:VCARD.
+TEST_F(AddressBookTest, ANulByteDoesNotCutACardShort) {
+    using namespace std::string_literals;
+    const struct {
+        const char* name;
+        std::string card;
+        std::u16string mobile;
+    } kCases[] = {
+        {"after a name",
+         "BEGIN:VCARD\r\nVERSION:3.0\r\nFN:Ann\0\r\nTEL;TYPE=CELL:+4471\r\nEND:VCARD\r\n"s,
+         u"+4471"},
+        {"behind a quoted-printable '='",
+         "BEGIN:VCARD\r\nVERSION:2.1\r\nFN;ENCODING=QUOTED-PRINTABLE:Chlo=\0E9\r\n"
+         "TEL;CELL:+4472\r\nEND:VCARD\r\n"s,
+         u"+4472"},
+        {"behind an escape and a folded line",
+         "BEGIN:VCARD\r\nVERSION:3.0\r\nFN:Bo\\\r\n \0\r\nTEL;TYPE=CELL:+4473\r\nEND:VCARD\r\n"s,
+         u"+4473"},
+    };
+    for (const auto& c : kCases) {
+        const AddressBookResult book = ParseVCards(c.card);
+        ASSERT_EQ(book.contacts.size(), 1u) << c.name;
+        EXPECT_EQ(book.contacts[0].mobile, c.mobile) << c.name;
+    }
 }
 
 TEST_F(AddressBookTest, TenThousandContactsAreAllRead) {
