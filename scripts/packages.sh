@@ -6,7 +6,7 @@ VQM_PACKAGES=(
     qt6-base-dev qt6-multimedia-dev qt6-qpa-plugins libx11-dev libxext-dev dbus
     clang-format gammu libgammu-dev
     libebook-contacts-1.2-4 libebook-1.2-21 evolution-data-server
-    help2man lintian
+    help2man lintian python3
 )
 
 # Installs whatever of the list is missing; nothing is fetched when all is there.
