@@ -28,6 +28,7 @@
 
 namespace fs = std::filesystem;
 using namespace std::chrono_literals;
+using namespace std::string_literals;
 
 namespace {
 
@@ -276,7 +277,7 @@ void IndexListSeeds() {
 }
 
 // The demo SIM's phonebook as Export writes it, and cards from other programs: vCard 2.1 with
-// quoted-printable and several numbers, a folded line, and a card inside another.
+// quoted-printable and several numbers, a folded line, a card inside another, and a NUL byte.
 void VCardSeeds() {
     std::string missing;
     const std::string exported = vqm::PhonebookToVCards(DemoPhonebook(), &missing);
@@ -294,6 +295,10 @@ void VCardSeeds() {
          "TEL;TYPE=WORK,FAX:01632960556\nTEL;TYPE=HOME:01632960555\nEND:VCARD\n"
          "BEGIN:VCARD\nVERSION:2.1\nFN:Office\nAGENT:\nBEGIN:VCARD\nFN:Reception\n"
          "TEL:02079460100\nEND:VCARD\nTEL;WORK:02079460123\nEND:VCARD\n");
+    // The shape of the target's first find: a NUL byte behind a quoted-printable '='.
+    Seed("fuzz_vcard_import",
+         "BEGIN:VCARD\r\nVERSION:2.1\r\nN;ENCODING=QUOTED-PRINTABLE:Martin;Chlo=\0E9\r\n"
+         "TEL;CELL:+447700900789\r\nEND:VCARD\r\n"s);
 }
 
 }  // namespace
