@@ -99,7 +99,7 @@ int OnIncomingCall(DialPad& pad, const EventRecord& record) {
     // The card repeats the ring every few seconds: a repeat leaves the caller's name and
     // number standing instead of blanking them until the next caller id.
     const bool repeat = pad.CallState() == kCallRinging;
-    pad.EnterRinging();
+    pad.EnterRinging(record.time);
     ui.BringDialPadForward();
     if (!repeat) ui.ShowStatus(u"Incoming call", u"");
     ui.DisplayOnIfOff();
@@ -109,6 +109,9 @@ int OnIncomingCall(DialPad& pad, const EventRecord& record) {
 
 int OnCallerId(DialPad& pad, const EventRecord& record) {
     if (record.length < 7 || pad.CallState() != kCallRinging) return 0;
+    // The caller id of a call before this one (answered, or turned down), handed over late:
+    // taken for this caller's it would log that caller again as unanswered.
+    if (pad.ReadBeforeTheRing(record.time)) return 0;
     char number[64];
     const int length = CallerIdNumber(record, pad.LinkRef().firmwareVersion, number, sizeof number);
     std::u16string shown = u"No number";

@@ -205,8 +205,22 @@ void DialPad::LeaveIdle() {
     idleLines_[1] = ui_.ControlText(kStatusLine2Id);
 }
 
-void DialPad::EnterRinging() {
-    if (callState_ != kCallRinging) ringingCaller_.clear();
+namespace {
+// A moment as one number that orders like the moment.
+uint64_t OrderOf(const SystemTime& t) {
+    return ((((static_cast<uint64_t>(t.year) * 13 + t.month) * 32 + t.day) * 24 + t.hour) * 60 +
+            t.minute) *
+               60000 +
+           t.second * 1000u + t.milliseconds;
+}
+}  // namespace
+
+void DialPad::EnterRinging(const SystemTime& readAt) {
+    if (callState_ != kCallRinging) {
+        ringingCaller_.clear();
+        ringReadAt_ =
+            OrderOf(readAt.year != 0 ? readAt : ToSystemTimeUtc(std::chrono::system_clock::now()));
+    }
     LeaveIdle();
     callState_ = kCallRinging;
 }
@@ -336,22 +350,16 @@ void DialPad::OnAnswerResult(int result) {
     }
 }
 
-namespace {
-// A moment as one number that orders like the moment.
-uint64_t OrderOf(const SystemTime& t) {
-    return ((((static_cast<uint64_t>(t.year) * 13 + t.month) * 32 + t.day) * 24 + t.hour) * 60 +
-            t.minute) *
-               60000 +
-           t.second * 1000u + t.milliseconds;
-}
-}  // namespace
-
 void DialPad::HangUpLater() {
     ++hangUpsPending_;
     worker_.Post([this] {
         HangUp(link_);
         --hangUpsPending_;
     });
+}
+
+bool DialPad::ReadBeforeTheRing(const SystemTime& readAt) const {
+    return readAt.year != 0 && OrderOf(readAt) < ringReadAt_;
 }
 
 bool DialPad::RingOfAHungUpCall(const SystemTime& readAt) const {

@@ -140,8 +140,11 @@ class DialPad {
 
     // Used by the alert handlers.
     int CallState() const { return callState_; }
-    // Becomes the ringing state; a ring that starts a new call forgets the last caller.
-    void EnterRinging();
+    // Becomes the ringing state; a ring that starts a new call forgets the last caller and
+    // keeps when the ring was read (readAt; a ring without a time counts as read now).
+    void EnterRinging(const SystemTime& readAt);
+    // A caller id read before the ringing call's ring: one of the call before, handed over late.
+    bool ReadBeforeTheRing(const SystemTime& readAt) const;
     // A ring read at readAt belongs to a call this pad hung up: read before End turned the
     // caller down, or handed over while the hang-up is still on its way. Not a new caller.
     bool RingOfAHungUpCall(const SystemTime& readAt) const;
@@ -224,6 +227,7 @@ class DialPad {
     // Hang-ups handed to the worker and not yet done: meanwhile the card may still list the
     // call, which is not a call to show again.
     std::atomic<int> hangUpsPending_{0};
+    uint64_t ringReadAt_ = 0;     // when the ringing call's first ring was read (OrderOf)
     uint64_t rejectedAt_ = 0;     // when End last turned a caller down (OrderOf)
     bool initialVolume_ = false;  // the volume set at connection, whose refusal greys the slider
     std::mutex polledMutex_;

@@ -384,6 +384,25 @@ TEST_P(DialPadCallTest, ARingReadBeforeTheRejectDoesNotRingAgain) {
     }));
 }
 
+// A caller id read before the ringing call's ring belongs to a call before it (the event queue
+// hands it over late): it neither shows nor logs the ringing caller as gone. One read since the
+// ring, with another number, is a new caller after one who gave up.
+TEST_P(DialPadCallTest, ACallerIdReadBeforeTheRingIsNotThisCallers) {
+    Start();
+    const auto readBefore = std::chrono::system_clock::now();
+    ASSERT_EQ(sim_->Control("ring 0555123"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return Ringing() && Text(kNumberDisplayId) == u"0555123"; }));
+    static const char kClip[] = "+CLIP: \"0555999\",129";
+    const char* end = kClip + sizeof kClip - 1;
+    OnCallerId(pad_->Pad(), MakeEventRecord(kEventCallerId, kClip, end, readBefore));
+    EXPECT_EQ(Text(kNumberDisplayId), u"0555123");
+    EXPECT_TRUE(Logged(kCallLogUnanswered).empty());
+    OnCallerId(pad_->Pad(),
+               MakeEventRecord(kEventCallerId, kClip, end, std::chrono::system_clock::now()));
+    EXPECT_EQ(Text(kNumberDisplayId), u"0555999");
+    EXPECT_EQ(Logged(kCallLogUnanswered), std::vector<std::string>{"0555123"});
+}
+
 TEST_P(DialPadCallTest, ARingLeftUnansweredIsLoggedAndCounted) {
     // Old firmware sends the caller's number unquoted.
     Start("SW3.80");
