@@ -29,7 +29,7 @@ namespace {
 constexpr int kMutexWaitMs = 5000;
 constexpr int kReadTimeoutMs = 200;  // a one-byte read waits at most this long
 constexpr int kAnswerPollMs = 100;   // the wait between looks for the first reply byte
-constexpr int kInterByteMs = 20;  // the bytes of one line follow each other closer
+constexpr int kInterByteMs = 20;     // the bytes of one line follow each other closer
 
 const char kInitCommands[7][32] = {
     "AT&F\r",
@@ -138,6 +138,22 @@ void WakeListener(Link& link) {
     (void)!write(link.wakeFd, &one, sizeof one);
 }
 
+namespace {
+
+std::string TakePartialLine(Link& link) {
+    std::lock_guard<std::mutex> lock(link.partialMutex);
+    std::string line;
+    line.swap(link.partialLine);
+    return line;
+}
+
+void KeepPartialLine(Link& link, std::string line) {
+    std::lock_guard<std::mutex> lock(link.partialMutex);
+    link.partialLine = std::move(line);
+}
+
+}  // namespace
+
 unsigned AtExchange(Link& link, const char* command, char* reply, size_t replySize,
                     const ExchangeOptions& options) {
     if (!reply || replySize == 0) return 0;
@@ -155,8 +171,7 @@ unsigned AtExchange(Link& link, const char* command, char* reply, size_t replySi
             // Stray bytes first: a line begun before this command is finished, not taken
             // for the reply.
             ReplyFramer stray(nullptr, nullptr, 0);
-            stray.ResumeLine(link.partialLine);
-            link.partialLine.clear();
+            stray.ResumeLine(TakePartialLine(link));
             if (!ReadInto(fd, stray, 0, 4096, nullptr)) failed = true;
             QueueUnsolicited(link, stray.TakeUnsolicited());
             framer.ResumeLine(stray.PartialLine());
@@ -260,7 +275,7 @@ unsigned AtExchange(Link& link, const char* command, char* reply, size_t replySi
                 link.echo.store(EchoMode::Echoes);
             else if (link.echo.load() == EchoMode::Unknown && framer.Length() > 0)
                 link.echo.store(EchoMode::Silent);
-            link.partialLine = framer.PartialLine();
+            KeepPartialLine(link, framer.PartialLine());
         }
     }
     if (!options.lockHeld) PortUnlock(link);
@@ -284,10 +299,10 @@ void TakeUnsolicitedBytes(Link& link) {
         std::shared_lock<std::shared_mutex> io(link.ioGuard);
         if (link.fd >= 0) {
             ReplyFramer framer(nullptr, nullptr, 0);
-            framer.ResumeLine(link.partialLine);
+            framer.ResumeLine(TakePartialLine(link));
             // The bytes of a line follow each other closely; 20 ms of silence ends the read.
             ReadInto(link.fd, framer, kInterByteMs, 4096, nullptr);
-            link.partialLine = framer.PartialLine();
+            KeepPartialLine(link, framer.PartialLine());
             lines = framer.TakeUnsolicited();
         }
     }
@@ -432,7 +447,7 @@ int PortOpenDevice(Link& link, const char* device) {
         link.fd = fd;
         link.echo.store(EchoMode::Unknown);
         link.unansweredInRow.store(0);
-        link.partialLine.clear();
+        TakePartialLine(link);
         ++link.openCount;
         link.servingTicket = link.nextTicket;  // nobody from an earlier opening is waiting
         link.portState.store(1);
@@ -535,14 +550,14 @@ unsigned AtReadPending(Link& link, char* buffer, size_t limit) {
         std::shared_lock<std::shared_mutex> io(link.ioGuard);
         // Only what is already there: this drain must not add a wait to every command.
         ReplyFramer framer(nullptr, nullptr, 0);
-        framer.ResumeLine(link.partialLine);
+        framer.ResumeLine(TakePartialLine(link));
         char byte;
         while (link.fd >= 0 && count < limit && ReadByte(link.fd, &byte, 0) == ReadResult::Byte) {
             buffer[count++] = byte;
             framer.Feed(byte);
         }
         buffer[count] = '\0';
-        link.partialLine = framer.PartialLine();
+        KeepPartialLine(link, framer.PartialLine());
         lines = framer.TakeUnsolicited();
     }
     PortUnlock(link);

@@ -60,7 +60,9 @@ struct Link {
     std::atomic<EchoMode> echo{EchoMode::Unknown};
     // Exchanges in a row that got no answer at all within their limit.
     std::atomic<int> unansweredInRow{0};
-    // The start of an unsolicited line that a read ended in the middle of (guarded by the port).
+    // The start of an unsolicited line that a read ended in the middle of. Guarded by its own
+    // mutex: an exchange of an earlier opening may still be leaving when the port reopens.
+    std::mutex partialMutex;
     std::string partialLine;
     // Written to wake the listener: an unsolicited record was queued, or the port closes.
     int wakeFd = -1;

@@ -8,6 +8,7 @@
 #include <QSocketNotifier>
 #include <cstdio>
 #include <cstring>
+#include <memory>
 
 #include "calls/call_log.h"
 #include "contacts/phonebook_cache.h"
@@ -120,6 +121,9 @@ int main(int argc, char** argv) {
     context.uiLog = &uiLog;
     context.callLog = &callLog;
     context.caches = &caches;
+    // vqm-phone's requests; made once the window is up, and gone only after the window, whose
+    // DialPad worker may still queue the exit's hang-up reply through the link's event feed.
+    std::unique_ptr<vqm::PhoneRequests> phone;
     vqm::MainWindow window(context, vqm::DefaultViewFactories());
 
     // Ctrl-C or a stop from the session ends the dialer as "Exit" does: the call is hung up
@@ -134,15 +138,14 @@ int main(int argc, char** argv) {
     });
 
     // vqm-phone's commands run on the socket's thread, on the dialer's link.
-    vqm::PhoneRequests phone(link, settings, &callLog, &caches,
-                             vqm::WindowSocketPath(runtimeRoot, vqm::kCompanionClass), [&] {
-                                 window.Messages().Post(&window, vqm::kMsgRefreshLists, 0, 0);
-                             });
+    phone = std::make_unique<vqm::PhoneRequests>(
+        link, settings, &callLog, &caches, vqm::WindowSocketPath(runtimeRoot, vqm::kCompanionClass),
+        [&] { window.Messages().Post(&window, vqm::kMsgRefreshLists, 0, 0); });
 
     // The first instance answers later starts, on the window's own thread.
     vqm::LineServer instance;
     if (!instance.Start(instancePath, [&](const std::string& line) {
-            if (vqm::PhoneRequests::IsRequest(line)) return phone.Answer(line);
+            if (vqm::PhoneRequests::IsRequest(line)) return phone->Answer(line);
             return vqm::AnswerWindowMessage(line, [&](unsigned msg, long w, long l) {
                 return window.Messages().Send(&window, msg, w, l);
             });
