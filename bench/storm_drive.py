@@ -6,9 +6,11 @@ rejected and unanswered calls in turn, answered and rejected with the DialPad's 
 the dialer's socket. Between calls the views are switched through the socket. Once a minute
 (and at the end) deliveries pause while every message delivered since the last sweep is found
 in the SIM message store exactly once; the sweep then deletes them through the SMS Folder, since
-the SIM holds at most 255. At the end: every call logged once in the right call log, every
-caller's number shown, the event queue drained, the dialer's resident memory growth after the
-first minute (from VmRSS, sampled each second) and its CPU use (from /proc/PID/stat).
+the SIM holds at most 255. At the end: every call logged once in the right call log (an answer
+that reached the card only after its caller gave up, 30 s on, belongs in the unanswered log and
+is counted apart), every caller's number shown, the event queue drained, the dialer's resident
+memory growth after the first minute (from VmRSS, sampled each second) and its CPU use (from
+/proc/PID/stat).
 
 Usage: storm_drive.py SECONDS WORK_DIR DIALER_PID CARD_PID
 Exit status 0 when every check held, 1 when one failed, 2 when the run could not go on.
@@ -41,8 +43,10 @@ INBOX_LIST, INBOX_DELETE = 1301, 1341
 CALL_RECORD, SMS_RECORD, EVENT_RECORD = 64, 704, 274
 SWEEP_EVERY = 60  # seconds of run between sweeps
 KINDS = ("answered", "rejected", "unanswered")
-# Limits for one step; a step that takes longer is a fault of the run, not a figure.
+# Limits for one step; a step that takes longer is a fault of the run, not a figure. A ring
+# not shown by the time the simulated card's caller would give up (30 s) is a lost event.
 STEP_LIMIT = 15.0
+RING_LIMIT = 25.0
 
 failures = []
 
@@ -182,7 +186,10 @@ class Storm:
     def __init__(self):
         self.log = UiLog()
         self.start = time.monotonic()
-        self.calls = []  # (number, kind)
+        self.calls = []  # [number, kind, the log it belongs in]
+        self.shown_after = []  # seconds from a ring to its caller shown
+        self.answered_after = []  # seconds from the Call key to the card's call active
+        self.late_answers = 0
         self.pending = []  # texts delivered since the last sweep
         self.verified = 0
         self.delivered = 0
@@ -238,9 +245,11 @@ class Storm:
             kind = KINDS[len(self.calls) % 3]
             number = "+4477001%05d" % len(self.calls)
             ctl("ring " + number)
-            self.calls.append((number, kind))
+            # What the call logs must show: answered, or unanswered (rejected, given up, or an
+            # answer that came only after the caller gave up).
+            self.calls.append([number, kind, "answered" if kind == "answered" else "unanswered"])
             self.call = {"number": number, "kind": kind, "stage": "ringing",
-                         "since": self.now()}
+                         "since": self.now(), "rang": self.now(), "entry": self.calls[-1]}
 
     def follow_call(self):
         """One step of the call under way; each stage has its limit."""
@@ -254,13 +263,14 @@ class Storm:
 
         if stage == "ringing":
             if self.log.shows("status " + call["number"]):
+                self.shown_after.append(self.now() - call["rang"])
                 if kind == "unanswered":
                     advance("giving-up")
                 else:
                     click(DIAL_PAD)
                     click(CALL_KEY if kind == "answered" else END_KEY)
                     advance("keyed")
-            elif age > STEP_LIMIT:
+            elif age > RING_LIMIT:
                 fail("%s rang for %.0f s without the dialer showing it" % (call["number"], age))
                 ctl("caller-hangup")
                 self.call = None
@@ -270,10 +280,16 @@ class Storm:
         elif stage == "keyed":
             state = card_call()
             if kind == "answered" and state == "active":
+                self.answered_after.append(age)
                 advance("talking")
+            elif kind == "answered" and state == "none":
+                # The caller gave up (after the card's 30 s) before the answer reached the card.
+                call["entry"][2] = "unanswered"
+                self.late_answers += 1
+                self.call = None
             elif kind == "rejected" and state == "none":
                 self.call = None
-            elif age > STEP_LIMIT:
+            elif age > RING_LIMIT + 30:
                 fail("%s (%s): the card still shows call=%s" % (call["number"], kind, state))
                 ctl("caller-hangup" if state == "incoming" else "remote-hangup")
                 self.call = None
@@ -323,7 +339,7 @@ class Storm:
         if final:
             return
         # Delete the Inbox through the folder, with no call waiting on the keys meanwhile.
-        wait(lambda: (self.step(paused=True), self.call is None)[1], 30.0)
+        wait(lambda: (self.step(paused=True), self.call is None)[1], 60.0)
         click(SMS_FOLDER, 30.0)
         click(INBOX_LIST, 30.0)
         click(INBOX_DELETE, 60.0)
@@ -359,19 +375,19 @@ class Storm:
         dialled = logged_numbers(2)
         unanswered = logged_numbers(3)
         counts = {"answered": 0, "rejected": 0, "unanswered": 0}
-        for number, kind in self.calls:
+        for number, kind, belongs in self.calls:
             counts[kind] += 1
-            want, other = (answered, unanswered) if kind == "answered" else (unanswered, answered)
+            want, other = (answered, unanswered) if belongs == "answered" else (unanswered, answered)
             if want.count(number) != 1 or number in other:
                 fail("%s (%s) logged %d times as answered and %d as unanswered"
                      % (number, kind, answered.count(number), unanswered.count(number)))
-        expected = {n for n, _ in self.calls}
+        expected = {n for n, _, _ in self.calls}
         for number in set(answered + unanswered) - expected:
             fail("%s is logged but never rang" % number)
         if dialled:
             fail("%d dialled calls logged, none made" % len(dialled))
         log = self.log.poll()
-        unseen = [n for n, _ in self.calls if not any("status " + n in line for line in log)]
+        unseen = [n for n, _, _ in self.calls if not any("status " + n in line for line in log)]
         if unseen:
             fail("%d callers never shown: %s" % (len(unseen), " ".join(unseen[:10])))
         if not wait(lambda: len(read(os.path.join(INSTALL, "event.log"))) == 0, 10.0):
@@ -382,6 +398,12 @@ class Storm:
               "%d messages delivered, %d found in the store once each"
               % (self.elapsed, len(self.calls), counts["answered"], counts["rejected"],
                  counts["unanswered"], self.delivered, self.verified))
+        if self.shown_after:
+            print("ring to caller shown: median %.2f s, worst %.2f s; Call key to answered: "
+                  "median %.2f s, worst %.2f s; answers after the caller gave up: %d"
+                  % (statistics.median(self.shown_after), max(self.shown_after),
+                     statistics.median(self.answered_after or [0]),
+                     max(self.answered_after or [0]), self.late_answers))
         print("call logs: %d answered, %d unanswered records; every call logged once: %s"
               % (len(answered), len(unanswered), "no" if any("logged" in f for f in failures)
                  else "yes"))
