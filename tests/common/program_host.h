@@ -55,6 +55,8 @@ class ProgramHost {
                     (temp_ / "state") + " >" + (temp_ / "cardsim.out") + " 2>&1");
         ASSERT_TRUE(
             WaitFor([&] { return ServerAnswers(WindowSocketPath(run_, kCompanionClass)); }));
+        // Its control socket comes up beside the card manager's, not necessarily first.
+        ASSERT_TRUE(WaitFor([&] { return Ctl("status").second == 0; }));
     }
     // options: the dialer's own (--answer-boxes, ...); returns once its socket answers.
     void StartDialer(const std::string& options) {
