@@ -81,8 +81,34 @@ struct RecordingSink : EventSink {
     }
 };
 
+// The messages the listener posts to the main window, in order.
+struct PostedMessages {
+    std::mutex mutex;
+    std::vector<int> messages;
+    void Add(int msg) {
+        std::lock_guard<std::mutex> lock(mutex);
+        messages.push_back(msg);
+    }
+    long Count(int msg) {
+        std::lock_guard<std::mutex> lock(mutex);
+        return std::count(messages.begin(), messages.end(), msg);
+    }
+};
+
 class LinkTest : public ::testing::Test {
   protected:
+    // A link whose listener passes come twenty times as fast, posting into posted.
+    std::unique_ptr<Link> OpenListening(FakeCard& card, PostedMessages& posted) {
+        auto link =
+            std::make_unique<Link>(settings_, DriverRoots{folder_ + "/run", folder_ + "/tty"});
+        link->sleepMs = [](int ms) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(ms / 20 + 1));
+        };
+        link->postToMain = [&posted](int msg) { posted.Add(msg); };
+        if (PortOpenDevice(*link, card.Device().c_str()) != 1) return nullptr;
+        return link;
+    }
+
     std::unique_ptr<Link> OpenLink(FakeCard& card) {
         auto link =
             std::make_unique<Link>(settings_, DriverRoots{folder_ + "/run", folder_ + "/tty"});
@@ -395,21 +421,10 @@ TEST_F(LinkTest, ListenerReportsActiveCallsAndOneEnd) {
         }
         return StandardCard(command);
     });
-    std::mutex m;
-    std::vector<int> posted;
-    auto link = std::make_unique<Link>(settings_, DriverRoots{folder_ + "/run", folder_ + "/tty"});
-    link->sleepMs = [](int ms) {
-        std::this_thread::sleep_for(std::chrono::milliseconds(ms / 20 + 1));
-    };
-    link->postToMain = [&](int msg) {
-        std::lock_guard<std::mutex> lock(m);
-        posted.push_back(msg);
-    };
-    ASSERT_EQ(PortOpenDevice(*link, card.Device().c_str()), 1);
-    auto count = [&](int msg) {
-        std::lock_guard<std::mutex> lock(m);
-        return std::count(posted.begin(), posted.end(), msg);
-    };
+    PostedMessages posted;
+    auto link = OpenListening(card, posted);
+    ASSERT_NE(link, nullptr);
+    auto count = [&](int msg) { return posted.Count(msg); };
     // Every pass while the call lasts.
     EXPECT_TRUE(testing::WaitFor([&] { return count(kMsgCallActive) >= 3; }));
     active = false;
@@ -427,21 +442,10 @@ TEST_F(LinkTest, ListenerReportsARingingCallOnEveryPass) {
         return command == "AT+CLCC" ? Ok("+CLCC: 1,1,4,0,0,\"+441234\",145")
                                     : StandardCard(command);
     });
-    std::mutex m;
-    std::vector<int> posted;
-    auto link = std::make_unique<Link>(settings_, DriverRoots{folder_ + "/run", folder_ + "/tty"});
-    link->sleepMs = [](int ms) {
-        std::this_thread::sleep_for(std::chrono::milliseconds(ms / 20 + 1));
-    };
-    link->postToMain = [&](int msg) {
-        std::lock_guard<std::mutex> lock(m);
-        posted.push_back(msg);
-    };
-    ASSERT_EQ(PortOpenDevice(*link, card.Device().c_str()), 1);
-    auto count = [&](int msg) {
-        std::lock_guard<std::mutex> lock(m);
-        return std::count(posted.begin(), posted.end(), msg);
-    };
+    PostedMessages posted;
+    auto link = OpenListening(card, posted);
+    ASSERT_NE(link, nullptr);
+    auto count = [&](int msg) { return posted.Count(msg); };
     EXPECT_TRUE(testing::WaitFor([&] { return count(kMsgCallRinging) >= 3; }));
     PortClose(*link);
     EXPECT_EQ(count(kMsgCallActive), 0);
