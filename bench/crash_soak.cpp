@@ -13,7 +13,7 @@
 // append cut short, it appends first and is killed as soon as that append returned, so that a
 // writer that appends behind the cut bytes shows up as torn and lost.
 //
-//   vqm-crash-soak [--kills N] [--kind FILE] [--seed S]
+//   vqm-crash-soak [--kills N] [--kind FILE] [--start N]
 //
 // Prints per kind the kills, the kills after which records were lost or the file torn, the
 // appends cut short by a kill, the operations done and the kills that landed inside one, and a
@@ -644,9 +644,9 @@ Op Choose(const Kind& kind, const State& state, std::mt19937& rng, bool append) 
     }
 }
 
-[[noreturn]] void RunWriter(const Kind& kind, const std::string& folder, State model, uint32_t seed,
-                            bool probe, int pipe) {
-    std::mt19937 rng(seed);
+[[noreturn]] void RunWriter(const Kind& kind, const std::string& folder, State model,
+                            uint32_t start, bool probe, int pipe) {
+    std::mt19937 rng(start);
     const Writer write = kind.writer(folder);
     const auto send = [pipe](char phase, const Op& op) {
         const Report report{phase, op};
@@ -668,14 +668,14 @@ Op Choose(const Kind& kind, const State& state, std::mt19937& rng, bool append) 
 // killed once its first operation (an append) ended instead. failed is set when the writer
 // ended any other way than by the kill.
 std::vector<Report> RunAndKill(const Kind& kind, const std::string& folder, const State& model,
-                               uint32_t seed, int delayUs, bool probe, bool* failed) {
+                               uint32_t start, int delayUs, bool probe, bool* failed) {
     int fds[2];
     if (pipe(fds) != 0) return {};
     std::fflush(nullptr);
     const pid_t pid = fork();
     if (pid == 0) {
         close(fds[0]);
-        RunWriter(kind, folder, model, seed, probe, fds[1]);
+        RunWriter(kind, folder, model, start, probe, fds[1]);
     }
     close(fds[1]);
     std::string bytes;
@@ -740,14 +740,14 @@ Tally Soak(const Kind& kind, const std::string& folder, int kills, std::mt19937&
     std::string lastTail;
     // The writer after a cut record is a probe: not one of the random kills.
     for (bool probe = false; tally.kills < kills;) {
-        const uint32_t seed = rng();
+        const uint32_t start = rng();
         const int delayUs = std::uniform_int_distribution<int>(0, kMaxDelayUs)(rng);
         const std::string at = (probe ? "the append after kill " : "kill ") +
                                std::to_string(tally.kills + (probe ? 0 : 1));
         std::optional<Op> inFlight;
         bool failed = false;
         for (const Report& report :
-             RunAndKill(kind, folder, committed, seed, delayUs, probe, &failed)) {
+             RunAndKill(kind, folder, committed, start, delayUs, probe, &failed)) {
             if (report.phase == 'B') inFlight = report.op;
             if (report.phase == 'E') {
                 committed = Steps(kind, committed, report.op).back();
@@ -814,7 +814,7 @@ Tally Soak(const Kind& kind, const std::string& folder, int kills, std::mt19937&
 }
 
 int Usage() {
-    std::fprintf(stderr, "usage: vqm-crash-soak [--kills N] [--kind FILE] [--seed S]\nkinds:");
+    std::fprintf(stderr, "usage: vqm-crash-soak [--kills N] [--kind FILE] [--start N]\nkinds:");
     for (const Kind& kind : Kinds())
         std::fprintf(stderr, " %s", kind.name.c_str());
     std::fprintf(stderr, "\n");
@@ -826,7 +826,7 @@ int Usage() {
 int main(int argc, char** argv) {
     int kills = 500;
     std::string only;
-    uint32_t seed = std::random_device{}();
+    uint32_t start = std::random_device{}();
     for (int i = 1; i < argc; ++i) {
         const std::string arg = argv[i];
         if (i + 1 >= argc) return Usage();
@@ -834,8 +834,8 @@ int main(int argc, char** argv) {
             kills = std::atoi(argv[++i]);
         else if (arg == "--kind")
             only = argv[++i];
-        else if (arg == "--seed")
-            seed = static_cast<uint32_t>(std::strtoul(argv[++i], nullptr, 10));
+        else if (arg == "--start")
+            start = static_cast<uint32_t>(std::strtoul(argv[++i], nullptr, 10));
         else
             return Usage();
     }
@@ -849,7 +849,7 @@ int main(int argc, char** argv) {
         std::perror("vqm-crash-soak: mkdtemp");
         return 1;
     }
-    std::printf("seed %u, %d kills per kind, files in %s\n", seed, kills, root.c_str());
+    std::printf("start %u, %d kills per kind, files in %s\n", start, kills, root.c_str());
     const char* format = "%-14s %6d %5d %5d %5d %8d %7d\n";
     std::printf("%-14s %6s %5s %5s %5s %8s %7s\n", "kind", "kills", "lost", "torn", "cut", "ops",
                 "mid-op");
@@ -857,8 +857,8 @@ int main(int argc, char** argv) {
     for (size_t i = 0; i < kinds.size(); ++i) {
         if (!only.empty() && only != kinds[i].name) continue;
         // Each kind has a generator of its own, so that --kind repeats that kind of a full run.
-        std::seed_seq seeds{seed, static_cast<uint32_t>(i)};
-        std::mt19937 rng(seeds);
+        // Each kind draws its own stream from the run's start number.
+        std::mt19937 rng(start + 0x9E3779B9u * static_cast<uint32_t>(i + 1));
         const std::string folder = root + "/" + fs::path(kinds[i].name).stem().string();
         const Tally t = Soak(kinds[i], folder, kills, rng);
         std::printf(format, kinds[i].name.c_str(), t.kills, t.lost, t.torn, t.cut, t.ops, t.midOp);

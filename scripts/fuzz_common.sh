@@ -1,8 +1,8 @@
 # Sourced by the fuzz scripts: the clang build of the libFuzzer targets (address and undefined
-# sanitizers) in $VQM_FUZZ_BUILD_DIR (build-fuzz by default), and where the seeds are kept.
+# sanitizers) in $VQM_FUZZ_BUILD_DIR (build-fuzz by default), and where the starting inputs are kept.
 top=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
 build=${VQM_FUZZ_BUILD_DIR:-$top/build-fuzz}
-seeds=$top/fuzz/corpus
+corpora=$top/fuzz/corpus
 
 source "$top/scripts/packages.sh"
 

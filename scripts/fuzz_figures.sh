@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # Runs every libFuzzer target in turn for a fixed number of executions (10 million by default,
-# one job each) from its seeds in fuzz/corpus/<target>/, and writes a table of executions,
+# one job each) from its starting inputs in fuzz/corpus/<target>/, and writes a table of executions,
 # libFuzzer's final coverage (cov: edges, ft: features), the corpus it ended with, wall time and
 # crashes to stdout and to $VQM_FUZZ_BUILD_DIR/fuzz-figures.md (or $VQM_FUZZ_FIGURES):
 #   bash scripts/fuzz_figures.sh [runs] [target...]
@@ -33,11 +33,11 @@ for name in "${targets[@]}"; do
     artifacts="$work/$name/artifacts"
     log="$work/$name/log"
     rm -rf "${work:?}/$name"
-    mkdir -p "$corpus" "$artifacts" "$seeds/$name"
+    mkdir -p "$corpus" "$artifacts" "$corpora/$name"
     start=$(date +%s%N)
     status=0
     "$build/fuzz/$name" -runs="$runs" -max_len=4096 -print_final_stats=1 \
-        -artifact_prefix="$artifacts/" "$corpus" "$seeds/$name" >"$log" 2>&1 || status=$?
+        -artifact_prefix="$artifacts/" "$corpus" "$corpora/$name" >"$log" 2>&1 || status=$?
     ms=$((($(date +%s%N) - start) / 1000000))
     seconds=$((ms / 1000))
     # The last status line carries the final coverage and corpus ("#N DONE cov: C ft: F corp:

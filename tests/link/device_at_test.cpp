@@ -225,7 +225,7 @@ TEST(DeviceReplies, CallListTellsNoCallFromNoise) {
 // empty call list: none of them may read as "no call".
 TEST(DeviceReplies, LineNoiseIsNeverAnEmptyCallList) {
     const std::string clean = "\r\nOK\r\n";
-    // A fixed seed: the same bursts on every run.
+    // A fixed start number: the same bursts on every run.
     std::minstd_rand bytes(1);
     for (int burst = 0; burst < 200; ++burst) {
         std::string noise;

@@ -163,7 +163,7 @@ class VqmPhoneTest : public ::testing::TestWithParam<std::tuple<const char*, boo
     }
     // A draft saved as the Write SMS view saves one and a message pasted onto the PC page,
     // both filed by the SMS Folder's own paste, as a user leaves them before vqm-phone runs.
-    void SeedComputerPages() {
+    void FillComputerPages() {
         SettingsStore settings(temp_ / "settings.db");
         MessageStore store(settings);
         StoreGuardCreate(store);
@@ -180,7 +180,7 @@ class VqmPhoneTest : public ::testing::TestWithParam<std::tuple<const char*, boo
         ASSERT_EQ(PasteIntoPage(store, link, kPagePda, ui), 1);
     }
     // Calls the dial pad would have logged: one answered, two unanswered (one without a number).
-    void SeedCallLogs() {
+    void FillCallLogs() {
         SettingsStore settings(temp_ / "settings.db");
         CallLog log(settings);
         ASSERT_EQ(AddAnsweredCall(log, "+447700900111"), 1);
@@ -211,7 +211,7 @@ TEST_P(VqmPhoneTest, StatusNamesTheCardItsNetworkAndSignal) {
 }
 
 TEST_P(VqmPhoneTest, DialsHangsUpAndLogsTheCall) {
-    ASSERT_NO_FATAL_FAILURE(SeedCallLogs());
+    ASSERT_NO_FATAL_FAILURE(FillCallLogs());
     Start();
     PhoneRun run = Phone("dial 5550100");
     EXPECT_EQ(run.code, 0) << run.output << Errors();
@@ -277,7 +277,7 @@ TEST_P(VqmPhoneTest, SendsToEachRecipientAndFilesOnTheSentPage) {
 }
 
 TEST_P(VqmPhoneTest, ListsEachFolderAndReadsAMessageWhole) {
-    ASSERT_NO_FATAL_FAILURE(SeedComputerPages());
+    ASSERT_NO_FATAL_FAILURE(FillComputerPages());
     Start();
     // The demo SIM's unsent message and the computer's pages (the Inbox is listed after a
     // delete, below).

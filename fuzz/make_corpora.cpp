@@ -1,8 +1,8 @@
-// Writes the seed corpora of the fuzz targets into <folder>/<target>/: the simulated card's
+// Writes the starting corpora of the fuzz targets into <folder>/<target>/: the simulated card's
 // replies to the commands the dialer sends (its demo SIM, on both personalities), message PDUs
 // from the codec tests, and files written by the program's own writers (folder records, the
-// transfer file, the index lists, vCards). scripts/fuzz_seeds.sh builds and runs it.
-//   vqm-fuzz-seeds <folder>
+// transfer file, the index lists, vCards). scripts/fuzz_corpora.sh builds and runs it.
+//   vqm-fuzz-corpora <folder>
 #include <algorithm>
 #include <chrono>
 #include <cstdint>
@@ -35,18 +35,18 @@ namespace {
 std::string g_root;
 std::map<std::string, int> g_counts;
 
-// One seed file; the names only number the seeds of a target.
-void Seed(const std::string& target, const std::string& bytes) {
+// One input file; the names only number the inputs of a target.
+void AddInput(const std::string& target, const std::string& bytes) {
     const fs::path folder = fs::path(g_root) / target;
     fs::create_directories(folder);
     char name[32];
-    std::snprintf(name, sizeof name, "seed-%02d", ++g_counts[target]);
+    std::snprintf(name, sizeof name, "input-%02d", ++g_counts[target]);
     std::ofstream(folder / name, std::ios::binary) << bytes;
 }
 
-// A seed whose first byte picks the parser of a target that serves several.
+// An input whose first byte picks the parser of a target that serves several.
 void Picked(const std::string& target, uint8_t selector, const std::string& reply) {
-    Seed(target, std::string(1, static_cast<char>(selector)) + reply);
+    AddInput(target, std::string(1, static_cast<char>(selector)) + reply);
 }
 
 std::string ReadFile(const std::string& path) {
@@ -105,7 +105,7 @@ std::vector<std::string> TestPduReplies() {
     };
 }
 
-void CardReplySeeds() {
+void CardReplyInputs() {
     for (const auto dialect : {vqm::cardsim::Dialect::Card, vqm::cardsim::Dialect::Standard}) {
         Card card(dialect);
         const std::string identity = card.Ask("AT+GMI") + card.Ask("AT+GMM");
@@ -125,9 +125,9 @@ void CardReplySeeds() {
         const std::string waitingLine = card.Advance(10ms);
         card.Ask("ATH");
 
-        Seed("fuzz_reply_parsing", call);
-        Seed("fuzz_reply_parsing", ring);
-        Seed("fuzz_reply_parsing", card.Ask("AT+CMGR=2"));
+        AddInput("fuzz_reply_parsing", call);
+        AddInput("fuzz_reply_parsing", ring);
+        AddInput("fuzz_reply_parsing", card.Ask("AT+CMGR=2"));
         Picked("fuzz_device_replies", 0, identity + firmware);
         Picked("fuzz_device_replies", 1, signal);
         Picked("fuzz_device_replies", 2 + 8 * 4, network);
@@ -139,9 +139,9 @@ void CardReplySeeds() {
         Picked("fuzz_device_replies", 7, call);
 
         card.Ask("AT+CPBS=\"SM\"");
-        Seed("fuzz_phonebook_entry", card.Ask("AT+CPBR=1,10"));
-        Seed("fuzz_phonebook_entry", card.Ask("AT+CPBS?"));
-        Seed("fuzz_phonebook_entry", card.Ask("AT+CPBR=?"));
+        AddInput("fuzz_phonebook_entry", card.Ask("AT+CPBR=1,10"));
+        AddInput("fuzz_phonebook_entry", card.Ask("AT+CPBS?"));
+        AddInput("fuzz_phonebook_entry", card.Ask("AT+CPBR=?"));
 
         Picked("fuzz_settings_replies", 0 + 6 * 4, card.Ask("AT+COPS=?"));
         Picked("fuzz_settings_replies", 1, network);
@@ -155,12 +155,12 @@ void CardReplySeeds() {
 
         card.Ask("AT+CMGF=0");
         for (int location = 1; location <= 4; ++location)
-            Seed("fuzz_sms_pdu", card.Ask("AT+CMGR=" + std::to_string(location)));
+            AddInput("fuzz_sms_pdu", card.Ask("AT+CMGR=" + std::to_string(location)));
         card.Ask("AT+CMGF=1");
-        Seed("fuzz_sms_pdu", card.Ask("AT+CMGR=3"));
+        AddInput("fuzz_sms_pdu", card.Ask("AT+CMGR=3"));
     }
     for (const std::string& reply : TestPduReplies())
-        Seed("fuzz_sms_pdu", reply);
+        AddInput("fuzz_sms_pdu", reply);
 }
 
 // The demo SIM's messages as the dialer reads them, and its phonebook's entries.
@@ -196,7 +196,7 @@ std::vector<vqm::PhonebookEntry> DemoPhonebook() {
 }
 
 // Files written by the program's own writers into a scratch install folder.
-void StoreSeeds() {
+void StoreInputs() {
     vqm::testing::TempFolder folder;
     vqm::SettingsStore settings(":memory:");
     vqm::SetSettingString(settings, u"InstallPath", vqm::Utf8ToUtf16(folder.Path() + "/").c_str());
@@ -213,7 +213,7 @@ void StoreSeeds() {
             vqm::StoreAppend(store, vqm::kFolderLocal, record);
         std::string bytes = ReadFile(local);
         if (torn > 0) bytes += std::string(reinterpret_cast<const char*>(&records[0]), torn);
-        Seed("fuzz_message_store", bytes);
+        AddInput("fuzz_message_store", bytes);
     };
     if (messages.size() < 5) std::abort();
     folderOf({messages[0]}, 0);
@@ -257,7 +257,7 @@ void StoreSeeds() {
 }
 
 // The index lists as the dialer writes them: "NewIdx", a NUL, then "UnreadIdx".
-void IndexListSeeds() {
+void IndexListInputs() {
     vqm::SettingsStore settings(":memory:");
     const auto list = [&](const char16_t* name) {
         char16_t text[vqm::kMaxSettingLength + 1] = {};
@@ -268,52 +268,52 @@ void IndexListSeeds() {
         vqm::IndexListAdd(settings, vqm::kNewIdx, location);
     for (int location : {12, 1})
         vqm::IndexListAdd(settings, vqm::kUnreadIdx, location);
-    Seed("fuzz_index_lists", list(vqm::kNewIdx) + std::string(1, '\0') + list(vqm::kUnreadIdx));
+    AddInput("fuzz_index_lists", list(vqm::kNewIdx) + std::string(1, '\0') + list(vqm::kUnreadIdx));
     vqm::IndexListRemove(settings, vqm::kNewIdx, 12);
-    Seed("fuzz_index_lists", list(vqm::kNewIdx));
+    AddInput("fuzz_index_lists", list(vqm::kNewIdx));
     for (int location = 1; location <= 50; ++location)
         vqm::IndexListAdd(settings, vqm::kUnreadIdx, location);
-    Seed("fuzz_index_lists", std::string(1, '\0') + list(vqm::kUnreadIdx));
+    AddInput("fuzz_index_lists", std::string(1, '\0') + list(vqm::kUnreadIdx));
 }
 
 // The demo SIM's phonebook as Export writes it, and cards from other programs: vCard 2.1 with
 // quoted-printable and several numbers, a folded line, a card inside another, and a NUL byte.
-void VCardSeeds() {
+void VCardInputs() {
     std::string missing;
     const std::string exported = vqm::PhonebookToVCards(DemoPhonebook(), &missing);
     if (exported.empty()) {
         std::fprintf(stderr, "no vCards written: %s is missing\n", missing.c_str());
         std::exit(1);
     }
-    Seed("fuzz_vcard_import", exported);
-    Seed("fuzz_vcard_import",
-         "BEGIN:VCARD\r\nVERSION:2.1\r\nN;CHARSET=ISO-8859-1;ENCODING=QUOTED-PRINTABLE:"
-         "Martin;Chlo=E9\r\nFN:Chlo=E9 Martin\r\nTEL;HOME;VOICE:01632 960001\r\n"
-         "TEL;WORK;VOICE:+44 (20) 7946-0123\r\nTEL;CELL:+447700900789\r\nEND:VCARD\r\n");
-    Seed("fuzz_vcard_import",
-         "BEGIN:VCARD\nVERSION:3.0\nFN:Dentist on the\n  high street\nORG:Surgery\n"
-         "TEL;TYPE=WORK,FAX:01632960556\nTEL;TYPE=HOME:01632960555\nEND:VCARD\n"
-         "BEGIN:VCARD\nVERSION:2.1\nFN:Office\nAGENT:\nBEGIN:VCARD\nFN:Reception\n"
-         "TEL:02079460100\nEND:VCARD\nTEL;WORK:02079460123\nEND:VCARD\n");
+    AddInput("fuzz_vcard_import", exported);
+    AddInput("fuzz_vcard_import",
+             "BEGIN:VCARD\r\nVERSION:2.1\r\nN;CHARSET=ISO-8859-1;ENCODING=QUOTED-PRINTABLE:"
+             "Martin;Chlo=E9\r\nFN:Chlo=E9 Martin\r\nTEL;HOME;VOICE:01632 960001\r\n"
+             "TEL;WORK;VOICE:+44 (20) 7946-0123\r\nTEL;CELL:+447700900789\r\nEND:VCARD\r\n");
+    AddInput("fuzz_vcard_import",
+             "BEGIN:VCARD\nVERSION:3.0\nFN:Dentist on the\n  high street\nORG:Surgery\n"
+             "TEL;TYPE=WORK,FAX:01632960556\nTEL;TYPE=HOME:01632960555\nEND:VCARD\n"
+             "BEGIN:VCARD\nVERSION:2.1\nFN:Office\nAGENT:\nBEGIN:VCARD\nFN:Reception\n"
+             "TEL:02079460100\nEND:VCARD\nTEL;WORK:02079460123\nEND:VCARD\n");
     // The shape of the target's first find: a NUL byte behind a quoted-printable '='.
-    Seed("fuzz_vcard_import",
-         "BEGIN:VCARD\r\nVERSION:2.1\r\nN;ENCODING=QUOTED-PRINTABLE:Martin;Chlo=\0E9\r\n"
-         "TEL;CELL:+447700900789\r\nEND:VCARD\r\n"s);
+    AddInput("fuzz_vcard_import",
+             "BEGIN:VCARD\r\nVERSION:2.1\r\nN;ENCODING=QUOTED-PRINTABLE:Martin;Chlo=\0E9\r\n"
+             "TEL;CELL:+447700900789\r\nEND:VCARD\r\n"s);
 }
 
 }  // namespace
 
 int main(int argc, char** argv) {
     if (argc != 2) {
-        std::fprintf(stderr, "usage: vqm-fuzz-seeds <folder>\n");
+        std::fprintf(stderr, "usage: vqm-fuzz-corpora <folder>\n");
         return 2;
     }
     g_root = argv[1];
-    CardReplySeeds();
-    StoreSeeds();
-    IndexListSeeds();
-    VCardSeeds();
+    CardReplyInputs();
+    StoreInputs();
+    IndexListInputs();
+    VCardInputs();
     for (const auto& [target, count] : g_counts)
-        std::printf("%-24s %d seeds\n", target.c_str(), count);
+        std::printf("%-24s %d inputs\n", target.c_str(), count);
     return 0;
 }
