@@ -98,6 +98,16 @@ class CacheBuildersTest : public ::testing::Test {
         std::lock_guard<std::mutex> lock(mutex_);
         return sent_;
     }
+    // The simulated card with its demo books, powered and on the link.
+    void StartDemoCard(std::unique_ptr<cardsim::CardSim>* sim) {
+        cardsim::SimConfig config;
+        config.baud = 0;
+        config.runtimeDir = temp_ / "sim";
+        config.stateFile = temp_ / "card.state";
+        *sim = std::make_unique<cardsim::CardSim>(config);
+        ASSERT_TRUE((*sim)->PowerUp());
+        ASSERT_EQ(PortOpenDevice(*link_, (*sim)->DevicePath().c_str()), 1);
+    }
     CacheNotify Notifier() {
         return [this](unsigned msg) {
             std::lock_guard<std::mutex> lock(mutex_);
@@ -340,13 +350,8 @@ TEST_F(CacheBuildersTest, APresentCacheIsReportedWithoutTheCard) {
 // The SIM builder against the simulated card
 
 TEST_F(CacheBuildersTest, TheDemoSimIsCopiedWholeAndLookedUpByNumber) {
-    cardsim::SimConfig config;
-    config.baud = 0;
-    config.runtimeDir = temp_ / "sim";
-    config.stateFile = temp_ / "card.state";
-    cardsim::CardSim sim(config);
-    ASSERT_TRUE(sim.PowerUp());
-    ASSERT_EQ(PortOpenDevice(*link_, sim.DevicePath().c_str()), 1);
+    std::unique_ptr<cardsim::CardSim> sim;
+    ASSERT_NO_FATAL_FAILURE(StartDemoCard(&sim));
     ASSERT_EQ(PhonebookSelect(*link_, kStorageSimCard), 0);
     int32_t used = 0, total = 0;
     ASSERT_EQ(PhonebookGetUsage(*link_, &used, &total), 1);
@@ -366,13 +371,8 @@ TEST_F(CacheBuildersTest, TheDemoSimIsCopiedWholeAndLookedUpByNumber) {
 // Whatever the files held before, a build leaves exactly the card's books: stray bytes of a
 // damaged file, which no load takes for a cache, and records of an earlier run go first.
 TEST_F(CacheBuildersTest, ABuildStartsFromEmptyFiles) {
-    cardsim::SimConfig config;
-    config.baud = 0;
-    config.runtimeDir = temp_ / "sim";
-    config.stateFile = temp_ / "card.state";
-    cardsim::CardSim sim(config);
-    ASSERT_TRUE(sim.PowerUp());
-    ASSERT_EQ(PortOpenDevice(*link_, sim.DevicePath().c_str()), 1);
+    std::unique_ptr<cardsim::CardSim> sim;
+    ASSERT_NO_FATAL_FAILURE(StartDemoCard(&sim));
     int32_t simUsed = 0, cardUsed = 0, total = 0;
     ASSERT_EQ(PhonebookSelect(*link_, kStorageSimCard), 0);
     ASSERT_EQ(PhonebookGetUsage(*link_, &simUsed, &total), 1);
@@ -433,16 +433,11 @@ TEST_F(CacheBuildersTest, ABuildStartsFromEmptyFiles) {
 }
 
 TEST_F(CacheBuildersTest, ACardPulledBetweenTheBooksLeavesTheSimBookWhole) {
-    cardsim::SimConfig config;
-    config.baud = 0;
-    config.runtimeDir = temp_ / "sim";
-    config.stateFile = temp_ / "card.state";
-    cardsim::CardSim sim(config);
-    ASSERT_TRUE(sim.PowerUp());
-    ASSERT_EQ(sim.Control("phonebook-fill SM 250"), "OK");
-    ASSERT_EQ(PortOpenDevice(*link_, sim.DevicePath().c_str()), 1);
+    std::unique_ptr<cardsim::CardSim> sim;
+    ASSERT_NO_FATAL_FAILURE(StartDemoCard(&sim));
+    ASSERT_EQ(sim->Control("phonebook-fill SM 250"), "OK");
     // The pause after the SIM's book is where the card goes.
-    caches_.pause = [&sim](int) { sim.Control("pull"); };
+    caches_.pause = [&sim](int) { sim->Control("pull"); };
     SimCacheBuild(caches_, *link_, Notifier());
     EXPECT_EQ(WaitReports(1), std::vector<unsigned>{kSimCacheDone});
     EXPECT_EQ(SimFile(1).size(), 250u);
@@ -451,7 +446,6 @@ TEST_F(CacheBuildersTest, ACardPulledBetweenTheBooksLeavesTheSimBookWhole) {
     PortClose(*link_);
 }
 
-// The address-book builder
 // The address-book builder
 
 AddressBookContact Contact(std::u16string name, std::u16string mobile, std::u16string home = {},
