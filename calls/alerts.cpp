@@ -114,6 +114,11 @@ int OnCallerId(DialPad& pad, const EventRecord& record) {
     if (pad.ReadBeforeTheRing(record.time)) return 0;
     char number[64];
     const int length = CallerIdNumber(record, pad.LinkRef().firmwareVersion, number, sizeof number);
+    ShowCaller(pad, number, length);
+    return 0;
+}
+
+void ShowCaller(DialPad& pad, const char* number, int length) {
     std::u16string shown = u"No number";
     char16_t name[64] = {};
     if (length > 0) {
@@ -135,7 +140,6 @@ int OnCallerId(DialPad& pad, const EventRecord& record) {
     pad.SetStatusLine(2, name);
     pad.SetStatusLine(3, shown);
     pad.SetStatusLine(5, shown);
-    return 0;
 }
 
 int OnCallWaiting(DialPad& pad, const EventRecord& record) {

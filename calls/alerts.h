@@ -33,6 +33,10 @@ int OnIncomingCall(DialPad& pad, const EventRecord& record);
 // "+CLIP:": the caller's number (and its name from the phonebook caches) on status lines 2 and 3
 // and in the number display. Returns 0.
 int OnCallerId(DialPad& pad, const EventRecord& record);
+// Shows the ringing call's caller as "+CLIP:" does: number (length bytes, 0 for "No number")
+// and name. A different number while the pad still rings for an earlier caller logs that
+// caller as unanswered.
+void ShowCaller(DialPad& pad, const char* number, int length);
 
 // "+CCWA:": a second caller waits behind the call in progress. The number (and its name) goes on
 // status line 3 as "Waiting: ..."; the call, its state, the display and the ring tone stay as

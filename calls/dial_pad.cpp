@@ -452,10 +452,15 @@ void DialPad::OnCallListEmpty() {
 // An answered call never rings again: the call talked on ended at the far end and a new
 // caller rang before the call list came up empty in between. The end is shown, then the ring
 // (whose own ring text came while the pad still talked, and was passed over then).
+// That caller's own id came while the pad talked and was passed over too: the number is the
+// one the call list shows, so that the old caller's number is neither shown nor logged for it.
 void DialPad::OnCallRinging() {
     if (callState_ != kCallVoice) return;
     OnEndKey(/*hangUp=*/false);
     OnIncomingCall(*this, EventRecord{});
+    if (callState_ != kCallRinging) return;
+    const std::string number = RingingNumber(link_);
+    ShowCaller(*this, number.c_str(), static_cast<int>(number.size()));
 }
 
 void DialPad::OnTimer(int id) {

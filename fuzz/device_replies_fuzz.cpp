@@ -4,6 +4,7 @@
 // address sanitizer. Each output is checked to stay within its buffer and to match its length.
 #include <cstdint>
 #include <cstring>
+#include <string>
 #include <vector>
 
 #include "link/device_at.h"
@@ -93,7 +94,11 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
             break;
         case 4: {
             int state = -1, mode = -1;
-            const int result = vqm::ParseCallListReply(text, length, &state, &mode);
+            std::string number;
+            const int result = vqm::ParseCallListReply(text, length, &state, &mode, &number);
+            // The number is one field of one line, at most its buffer and a '+'.
+            if (number.size() > 64 || number.find_first_of("\r\n\"") != std::string::npos)
+                __builtin_trap();
             if (result != vqm::kCallListCall && result != vqm::kCallListEmpty &&
                 result != vqm::kCallListUnknown)
                 __builtin_trap();

@@ -54,7 +54,7 @@ LineKind Classify(const char* line, const char* end) {
 }
 
 // "<idx>,<dir>,<stat>,<mode>" after a "+CLCC:" tag, then the line's end or more fields.
-bool ReadCallLine(FieldCursor& cursor, int* state, int* mode) {
+bool ReadCallLine(FieldCursor& cursor, int* state, int* mode, std::string* number) {
     int32_t index = 0, direction = 0, callState = 0, callMode = 0;
     if (!(cursor.NextInt(&index) && cursor.Comma() && cursor.NextInt(&direction) &&
           cursor.Comma() && cursor.NextInt(&callState) && cursor.Comma() &&
@@ -63,6 +63,21 @@ bool ReadCallLine(FieldCursor& cursor, int* state, int* mode) {
     if (!cursor.AtLineEnd() && *cursor.Position() != ',') return false;
     if (state) *state = callState;
     if (mode) *mode = callMode;
+    if (number) {
+        // ",<mpty>,\"<number>\",<type>": the number is optional, and a damaged one is none.
+        number->clear();
+        int32_t multiparty = 0;
+        char text[64];
+        int length = 0;
+        int32_t type = 0;
+        if (cursor.Comma() && cursor.NextInt(&multiparty) && cursor.Comma() &&
+            cursor.NextQuoted(text, sizeof text, &length) && length > 0) {
+            // A type of 145 (international) puts in front the '+' the number may lack.
+            if (cursor.Comma() && cursor.NextInt(&type) && type == 145 && text[0] != '+')
+                number->push_back('+');
+            number->append(text, static_cast<size_t>(length));
+        }
+    }
     return true;
 }
 
@@ -180,7 +195,8 @@ int ParseVolumeReply(const char* reply, int length) {
     return cursor.SeekPast("+CLVL:") && cursor.NextInt(&level) ? level : -1;
 }
 
-int ParseCallListReply(const char* reply, int length, int* state, int* mode) {
+int ParseCallListReply(const char* reply, int length, int* state, int* mode,
+                       std::string* number) {
     FieldCursor cursor(reply, length);
     if (cursor.AtEnd()) return kCallListUnknown;
     bool ok = false;
@@ -192,7 +208,7 @@ int ParseCallListReply(const char* reply, int length, int* state, int* mode) {
         switch (Classify(line, end)) {
             case LineKind::kCallList: {
                 FieldCursor fields(line, end);
-                if (fields.NextTag("+CLCC:") && ReadCallLine(fields, state, mode))
+                if (fields.NextTag("+CLCC:") && ReadCallLine(fields, state, mode, number))
                     return kCallListCall;
                 // A damaged record: a call may well be there.
                 return kCallListUnknown;
@@ -309,11 +325,12 @@ int SetSpeakerVolume(Link& link, int level) {
     return length == 0 ? -1 : AtFinalResult(reply, length);
 }
 
-int QueryCallState(Link& link, int* state, int* mode) {
+int QueryCallState(Link& link, int* state, int* mode, std::string* number) {
     char reply[kReplySize];
     const int length = static_cast<int>(
         AtCommandWithin(link, "AT+CLCC\r", reply, sizeof reply, kQueryAnswerLimitMs));
-    return length == 0 ? kCallListUnknown : ParseCallListReply(reply, length, state, mode);
+    return length == 0 ? kCallListUnknown
+                       : ParseCallListReply(reply, length, state, mode, number);
 }
 
 }  // namespace vqm

@@ -13,6 +13,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <string>
 
 namespace vqm {
 
@@ -52,12 +53,14 @@ inline constexpr int kCallListUnknown = -1;  // cannot tell (damaged, ERROR, no 
 
 // Reads an "AT+CLCC" reply line by line. kCallListCall with the state and mode of the first
 // "+CLCC: <idx>,<dir>,<stat>,<mode>[,...]" line, which must be whole (a damaged one gives
-// kCallListUnknown). kCallListEmpty only when the reply holds one "OK" line and every other line
+// kCallListUnknown); when number is given, the line's quoted number goes there (empty when the
+// line has none). kCallListEmpty only when the reply holds one "OK" line and every other line
 // is blank, the command's echo (before the OK), or a printable unsolicited line that is not
 // "+CLCC:" ("RING", "+CRING: VOICE", "+CMTI: ...", "*ECAV: ...", arriving meanwhile). Anything
 // else (line noise, "ERROR", "+CME ERROR: <n>", no final result) is kCallListUnknown: noise must
 // never read as "no call", which would end the call.
-int ParseCallListReply(const char* reply, int length, int* state, int* mode);
+int ParseCallListReply(const char* reply, int length, int* state, int* mode,
+                       std::string* number = nullptr);
 
 // The caller's number of one "+CLIP:" line (the text starts with the tag). Firmware up to 3.81
 // sends the number bare and later firmware quotes it; a line whose first field is quoted is read
@@ -86,7 +89,8 @@ int GetSpeakerVolume(Link& link);
 // "AT+CLVL=<level>": the final result of the reply, -1 when none came.
 int SetSpeakerVolume(Link& link, int level);
 // "AT+CLCC": kCallListCall with *state and *mode, kCallListEmpty, or kCallListUnknown (also when
-// no reply came): "no reply" and "damaged" are never reported as "no call".
-int QueryCallState(Link& link, int* state, int* mode);
+// no reply came): "no reply" and "damaged" are never reported as "no call". number, when given,
+// gets the listed call's number.
+int QueryCallState(Link& link, int* state, int* mode, std::string* number = nullptr);
 
 }  // namespace vqm

@@ -359,10 +359,13 @@ void ListenerThread(Link* link) {
             // call, the next empty call list still ends it.
             if (rings > 0) callSeen = true;
         }
-        if (link->portState.load() == 1 && steady_clock::now() >= nextPoll) {
+        // A poll that falls due while an exchange holds the port waits for its turn in the
+        // port's queue: looking again and again until the port is free would spin.
+        if (link->portState.load() != 0 && steady_clock::now() >= nextPoll) {
             nextPoll = steady_clock::now() + std::chrono::milliseconds(link->listenerPassMs);
             int state = -1, mode = -1;
-            const int calls = QueryCallState(*link, &state, &mode);
+            std::string number;
+            const int calls = QueryCallState(*link, &state, &mode, &number);
             // Exchanges that any card answers at once have gone unanswered several times in a
             // row, over several seconds: the card is taken for gone, once.
             const bool silent = link->unansweredInRow.load() >= kUnansweredGone;
@@ -374,6 +377,10 @@ void ListenerThread(Link* link) {
                     if (link->postToMain) link->postToMain(kMsgCallActive);
                     callSeen = true;
                 } else if (state == 4 && mode == 0 && link->postToMain) {
+                    {
+                        std::lock_guard<std::mutex> lock(link->ringingMutex);
+                        link->ringingNumber = number;
+                    }
                     link->postToMain(kMsgCallRinging);
                 }
                 if (state == 4 && mode == 0 && !callSeen) {
@@ -479,6 +486,11 @@ void PortClose(Link& link) {
         close(link.fd);
         link.fd = -1;
     }
+}
+
+std::string RingingNumber(Link& link) {
+    std::lock_guard<std::mutex> lock(link.ringingMutex);
+    return link.ringingNumber;
 }
 
 int PortTryLock(Link& link) {

@@ -64,6 +64,10 @@ struct Link {
     // mutex: an exchange of an earlier opening may still be leaving when the port reopens.
     std::mutex partialMutex;
     std::string partialLine;
+    // The number of the ringing call the listener's last poll found (kMsgCallRinging): a pad
+    // that missed that caller's id while it still talked shows it from here.
+    std::mutex ringingMutex;
+    std::string ringingNumber;
     // Written to wake the listener: an unsolicited record was queued, or the port closes.
     int wakeFd = -1;
 
@@ -72,6 +76,9 @@ struct Link {
     std::shared_mutex ioGuard;
     std::thread listener;
 };
+
+// The number kept with the last kMsgCallRinging; empty when the call list showed none.
+std::string RingingNumber(Link& link);
 
 // Opens the card's port at 19200 8N1 with DTR off, initialises the card, reads its firmware
 // and starts the listener. 1 on success; 0 with everything closed again.

@@ -347,6 +347,27 @@ TEST_P(DialPadCallTest, ACallerRingingAsTheFarEndHangsUpEndsTheCallAndRings) {
     EXPECT_TRUE(Logged(kCallLogUnanswered).empty());
 }
 
+// The new caller's own id came while the pad still talked and was passed over: the ring the
+// call list reports brings that caller's number with it, so that neither the display nor the
+// log keeps the caller before.
+TEST_P(DialPadCallTest, ARingFoundByTheCallListShowsAndLogsItsOwnCaller) {
+    Start();
+    ASSERT_EQ(sim_->Control("ring 0555123"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return Ringing() && Text(kNumberDisplayId) == u"0555123"; }));
+    ASSERT_EQ(sim_->Control("local-answer"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return State() == kCallVoice; }));
+    {
+        std::lock_guard<std::mutex> lock(link_.ringingMutex);
+        link_.ringingNumber = "0555777";
+    }
+    window_->OnMessage(kMsgCallRinging, 0, 0);
+    EXPECT_TRUE(Ringing());
+    EXPECT_EQ(Text(kNumberDisplayId), u"0555777");
+    Click(kKeyEndId);
+    EXPECT_EQ(Logged(kCallLogAnswered), std::vector<std::string>{"0555123"});
+    EXPECT_EQ(Logged(kCallLogUnanswered), std::vector<std::string>{"0555777"});
+}
+
 // An empty call list ends a ring without a hang-up: here the card still rings (as for a caller
 // who rang again since the list was read), and the ring comes back on the pad.
 TEST_P(DialPadCallTest, AnEmptyCallListEndsARingWithoutHangingUpOnTheCard) {

@@ -181,17 +181,20 @@ struct CallListRow {
     int result;
     int state;
     int mode;
+    const char* number = "";  // the listed call's number, with '+' for a type of 145
 };
 
 TEST(DeviceReplies, CallListTellsNoCallFromNoise) {
     const std::string clean = "\r\nOK\r\n";
     const CallListRow rows[] = {
-        {kCard, Ok("+CLCC: 1,1,0,0,0,\"+447700900123\",145"), kCallListCall, 0, 0},
-        {kCard, Ok("+CLCC: 1,1,4,0,0,\"07700900123\",129"), kCallListCall, 4, 0},
-        {kCard, Ok("+CLCC: 1,0,2,0,0,\"112\",129"), kCallListCall, 2, 0},
+        {kCard, Ok("+CLCC: 1,1,0,0,0,\"+447700900123\",145"), kCallListCall, 0, 0, "+447700900123"},
+        {kCard, Ok("+CLCC: 1,1,4,0,0,\"07700900123\",129"), kCallListCall, 4, 0, "07700900123"},
+        {kCard, Ok("+CLCC: 1,0,2,0,0,\"112\",129"), kCallListCall, 2, 0, "112"},
         {kCard, clean, kCallListEmpty, -1, -1},
         {kCard, "\r\n+CRING: VOICE\r\n\r\n+CLIP: +4477,145\r\n" + clean, kCallListEmpty, -1, -1},
-        {kStandard, Ok("+CLCC: 1,1,4,0,0,\"4915112345678\",145,\"\""), kCallListCall, 4, 0},
+        {kStandard, Ok("+CLCC: 1,1,4,0,0,\"4915112345678\",145,\"\""), kCallListCall, 4, 0,
+         "+4915112345678"},
+        {kStandard, Ok("+CLCC: 1,1,4,0,0,\"\",128"), kCallListCall, 4, 0},  // withheld
         {kStandard, Ok("+CLCC: 1,0,3,1,0"), kCallListCall, 3, 1},
         {kStandard, Ok("+CLCC: 1,0,0,0,0\r\n+CLCC: 2,1,5,0,0"), kCallListCall, 0, 0},
         {kStandard, "AT+CLCC\r\r\nOK\r\n", kCallListEmpty, -1, -1},
@@ -207,6 +210,7 @@ TEST(DeviceReplies, CallListTellsNoCallFromNoise) {
         {kDamaged, Ok("+CLCC: 1,1\xff,0,0,0"), kCallListUnknown, -1, -1},
         {kDamaged, "\r\n+CLCC: 1,1,4", kCallListUnknown, -1, -1},
         {kDamaged, Ok("+CLCC: 1,1,4,0x"), kCallListUnknown, -1, -1},
+        {kDamaged, Ok("+CLCC: 1,1,4,0,0,\"+4477"), kCallListCall, 4, 0},  // an unclosed number
         {kDamaged, clean + clean, kCallListUnknown, -1, -1},
         {kDamaged, clean + "AT+CLCC\r", kCallListUnknown, -1, -1},
         {kDamaged, "\r\nO\r\n", kCallListUnknown, -1, -1},
@@ -214,10 +218,15 @@ TEST(DeviceReplies, CallListTellsNoCallFromNoise) {
     for (const CallListRow& row : rows) {
         const Bytes reply(row.reply);
         int state = -1, mode = -1;
-        EXPECT_EQ(ParseCallListReply(reply.text(), reply.length(), &state, &mode), row.result)
+        std::string number = "left over";
+        EXPECT_EQ(ParseCallListReply(reply.text(), reply.length(), &state, &mode, &number),
+                  row.result)
             << SourceName(row.source) << " " << row.reply;
         EXPECT_EQ(state, row.state) << row.reply;
         EXPECT_EQ(mode, row.mode) << row.reply;
+        if (row.result == kCallListCall) {
+            EXPECT_EQ(number, row.number) << row.reply;
+        }
     }
 }
 

@@ -6,6 +6,7 @@
 #include <atomic>
 #include <chrono>
 #include <cstring>
+#include <ctime>
 #include <filesystem>
 #include <fstream>
 #include <mutex>
@@ -447,6 +448,7 @@ TEST_F(LinkTest, ListenerReportsARingingCallOnEveryPass) {
     ASSERT_NE(link, nullptr);
     auto count = [&](int msg) { return posted.Count(msg); };
     EXPECT_TRUE(testing::WaitFor([&] { return count(kMsgCallRinging) >= 3; }));
+    EXPECT_EQ(RingingNumber(*link), "+441234");  // the caller comes with it
     PortClose(*link);
     EXPECT_EQ(count(kMsgCallActive), 0);
     EXPECT_EQ(count(kMsgCallListEmpty), 0);
@@ -473,6 +475,35 @@ TEST_F(LinkTest, ListenerRingsForAnIncomingCallWithoutRingText) {
     PortClose(*link);
     EXPECT_EQ(sink_.queued.size(), 1u);  // once, not on every pass
     EXPECT_EQ(sink_.next, 1u);
+}
+
+// A poll that falls due while an exchange holds the port waits in the port's queue instead of
+// looking again and again (a busy listener took a whole core while the SMS Folder read 50
+// messages), and goes out as soon as the port is given back.
+TEST_F(LinkTest, ListenerWaitsForAPortHeldPastItsPoll) {
+    std::atomic<int> callPolls{0};
+    FakeCard card([&](const std::string& command) {
+        if (command == "AT+CLCC") ++callPolls;
+        return StandardCard(command);
+    });
+    PostedMessages posted;
+    auto link = OpenListening(card, posted);
+    ASSERT_NE(link, nullptr);
+    ASSERT_TRUE(testing::WaitFor([&] { return callPolls >= 1; }));
+    ASSERT_EQ(PortLock(*link), 1);
+    const int polls = callPolls;
+    timespec cpuBefore{}, cpuAfter{};
+    clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &cpuBefore);
+    // Passes come every 50 ms here: twenty fall due during the hold.
+    std::this_thread::sleep_for(std::chrono::seconds(1));
+    clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &cpuAfter);
+    const double cpuSeconds = double(cpuAfter.tv_sec - cpuBefore.tv_sec) +
+                              double(cpuAfter.tv_nsec - cpuBefore.tv_nsec) / 1e9;
+    EXPECT_LT(cpuSeconds, 0.15) << "the listener spun while the port was held";
+    EXPECT_EQ(callPolls, polls);
+    PortUnlock(*link);
+    EXPECT_TRUE(testing::WaitFor([&] { return callPolls > polls; }));
+    PortClose(*link);
 }
 
 }  // namespace
