@@ -94,7 +94,7 @@ int OnIncomingCall(DialPad& pad, const EventRecord& record) {
     if (pad.CallState() == kCallDialing || pad.CallState() == kCallVoice) return 0;
     // A repeat of the ring turned down here, handed over late, must not ring again (and log
     // its caller a second time).
-    if (pad.RingOfAHungUpCall(record.time)) return 0;
+    if (pad.RingOfAnEndedCall(record.time)) return 0;
     DialPadUi& ui = pad.Ui();
     // The card repeats the ring every few seconds: a repeat leaves the caller's name and
     // number standing instead of blanking them until the next caller id.

@@ -362,10 +362,10 @@ bool DialPad::ReadBeforeTheRing(const SystemTime& readAt) const {
     return readAt.year != 0 && OrderOf(readAt) < ringReadAt_;
 }
 
-bool DialPad::RingOfAHungUpCall(const SystemTime& readAt) const {
+bool DialPad::RingOfAnEndedCall(const SystemTime& readAt) const {
     if (hangUpsPending_.load() > 0) return true;
     // A ring the pad makes up itself (no time) is of the call the list shows now.
-    return readAt.year != 0 && OrderOf(readAt) <= rejectedAt_;
+    return readAt.year != 0 && OrderOf(readAt) <= ringEndedAt_;
 }
 
 void DialPad::OnEndKey(bool hangUp) {
@@ -379,10 +379,8 @@ void DialPad::OnEndKey(bool hangUp) {
             EndWith(u"Call ended");
             break;
         case kCallRinging: {
-            if (hangUp) {
-                rejectedAt_ = OrderOf(ToSystemTimeUtc(std::chrono::system_clock::now()));
-                HangUpLater();
-            }
+            ringEndedAt_ = OrderOf(ToSystemTimeUtc(std::chrono::system_clock::now()));
+            if (hangUp) HangUpLater();
             EndWith(u"Unanswered");
             ui_.StopRingTone();
             char narrow[kCallLogNumberSize];

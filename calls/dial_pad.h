@@ -145,9 +145,11 @@ class DialPad {
     void EnterRinging(const SystemTime& readAt);
     // A caller id read before the ringing call's ring: one of the call before, handed over late.
     bool ReadBeforeTheRing(const SystemTime& readAt) const;
-    // A ring read at readAt belongs to a call this pad hung up: read before End turned the
-    // caller down, or handed over while the hang-up is still on its way. Not a new caller.
-    bool RingOfAHungUpCall(const SystemTime& readAt) const;
+    // A ring read at readAt belongs to a ringing call that has ended: read before End turned
+    // the caller down or before an empty call list ended the ring (a repeat of the ring read
+    // with that list and handed over after it), or handed over while a hang-up is still on its
+    // way. Not a new caller: the card repeats a new caller's ring every few seconds.
+    bool RingOfAnEndedCall(const SystemTime& readAt) const;
     // The number the ringing call's caller id showed, empty until one came.
     std::u16string& RingingCaller() { return ringingCaller_; }
     void RefreshNumberDisplay();
@@ -228,7 +230,7 @@ class DialPad {
     // call, which is not a call to show again.
     std::atomic<int> hangUpsPending_{0};
     uint64_t ringReadAt_ = 0;     // when the ringing call's first ring was read (OrderOf)
-    uint64_t rejectedAt_ = 0;     // when End last turned a caller down (OrderOf)
+    uint64_t ringEndedAt_ = 0;    // when a ring last ended, by End or the call list (OrderOf)
     bool initialVolume_ = false;  // the volume set at connection, whose refusal greys the slider
     std::mutex polledMutex_;
     std::u16string polledOperator_;

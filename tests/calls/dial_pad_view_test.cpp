@@ -381,22 +381,34 @@ TEST_P(DialPadCallTest, AnEmptyCallListEndsARingWithoutHangingUpOnTheCard) {
     EXPECT_NE(sim_->Control("status").find("call=incoming"), std::string::npos);
 }
 
-// A caller turned down with End: a repeat of its ring read before End (handed over late, as
-// the event queue waits for the port) does not ring again nor log the caller twice; a ring
-// read after the hang-up is a new call.
-TEST_P(DialPadCallTest, ARingReadBeforeTheRejectDoesNotRingAgain) {
+// A caller turned down with End, or gone by the time the call list is read: a repeat of its
+// ring read before that (handed over late, as the event queue waits for the port, or read with
+// the empty list) does not ring again nor log the caller twice; a ring read after the end is a
+// new call.
+TEST_P(DialPadCallTest, ARingReadBeforeTheRingEndedDoesNotRingAgain) {
     Start();
-    ASSERT_EQ(sim_->Control("ring 0555123"), "OK");
-    ASSERT_TRUE(WaitFor([&] { return Ringing() && Text(kNumberDisplayId) == u"0555123"; }));
-    const auto readBefore = std::chrono::system_clock::now();
-    Click(kKeyEndId);
-    ASSERT_TRUE(CardIdle());
     static const char kRing[] = "+CRING: VOICE";
     const char* end = kRing + sizeof kRing - 1;
+    // The caller gives up: the list comes up empty, the repeat read with it comes after.
+    ASSERT_EQ(sim_->Control("ring 0555999"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return Ringing() && Text(kNumberDisplayId) == u"0555999"; }));
+    auto readBefore = std::chrono::system_clock::now();
+    ASSERT_EQ(sim_->Control("caller-hangup"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return State() == kCallEnded; }));
+    OnIncomingCall(pad_->Pad(), MakeEventRecord(kEventRing, kRing, end, readBefore));
+    EXPECT_EQ(State(), kCallEnded);
+    EXPECT_EQ(Logged(kCallLogUnanswered), std::vector<std::string>{"0555999"});
+
+    // Turned down with End.
+    ASSERT_EQ(sim_->Control("ring 0555123"), "OK");
+    ASSERT_TRUE(WaitFor([&] { return Ringing() && Text(kNumberDisplayId) == u"0555123"; }));
+    readBefore = std::chrono::system_clock::now();
+    Click(kKeyEndId);
+    ASSERT_TRUE(CardIdle());
     OnIncomingCall(pad_->Pad(), MakeEventRecord(kEventRing, kRing, end, readBefore));
     EXPECT_EQ(State(), kCallEnded);
     EXPECT_EQ(Text(kStatusLine1Id), u"Unanswered");
-    EXPECT_EQ(Logged(kCallLogUnanswered), std::vector<std::string>{"0555123"});
+    EXPECT_EQ(Logged(kCallLogUnanswered), (std::vector<std::string>{"0555999", "0555123"}));
     // (Once the hang-up's exchange has ended: the card takes it just before.)
     EXPECT_TRUE(WaitFor([&] {
         OnIncomingCall(pad_->Pad(),
