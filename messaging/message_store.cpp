@@ -354,8 +354,12 @@ int IndexListAdd(SettingsStore& settings, const char16_t* name, int location) {
     std::string list;
     if (!ReadList(settings, name, &list))
         return WriteList(settings, name, QuotedLocation(location));
-    for (const ListEntry& entry : WalkList(list))
+    const std::vector<ListEntry> entries = WalkList(list);
+    for (const ListEntry& entry : entries)
         if (entry.location == location) return 1;
+    // Whatever follows the last whole entry (an entry cut short, left by a damaged store) is
+    // unreadable; kept in front of the new location it would swallow that too.
+    list.resize(entries.empty() ? 0 : entries.back().end);
     return WriteList(settings, name, list + QuotedLocation(location));
 }
 

@@ -271,7 +271,10 @@ TEST_F(MessageStoreTest, DamagedIndexListsAreReadAsFarAsTheyAreSound) {
         if (c.absent > 0) {
             EXPECT_EQ(IndexListContains(settings_, kNewIdx, c.absent), 0);
         }
+        // A location added after the damage is found: what cannot be read goes.
         EXPECT_EQ(IndexListAdd(settings_, kNewIdx, 40), 1);
+        EXPECT_EQ(IndexListContains(settings_, kNewIdx, 40), 1) << Utf16ToUtf8(c.value);
+        EXPECT_EQ(IndexListCount(settings_, kNewIdx), c.count + 1) << Utf16ToUtf8(c.value);
         EXPECT_EQ(IndexListRemove(settings_, kNewIdx, 40), 1);
         EXPECT_EQ(IndexListContains(settings_, kNewIdx, 40), 0) << Utf16ToUtf8(c.value);
     }
