@@ -58,7 +58,8 @@ fi
 echo "card's personality: $dialect"
 status=0
 python3 "$top/bench/storm_drive.py" "$seconds" "$work" "$dialer_pid" "$card_pid" || status=$?
-if ((status != 0)) && [[ -n ${VQM_STORM_KEEP:-} ]]; then
+# VQM_STORM_KEEP=DIR keeps the run's folder (ui log, call logs, store) for a look afterwards.
+if [[ -n ${VQM_STORM_KEEP:-} ]]; then
     cp -r "$work" "$VQM_STORM_KEEP" && echo "storm: the run's folder is kept in $VQM_STORM_KEEP" >&2
 fi
 exit "$status"

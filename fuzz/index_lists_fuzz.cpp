@@ -1,7 +1,7 @@
 // Feeds arbitrary text to the "NewIdx" and "UnreadIdx" settings (split at the first NUL byte,
 // each read as UTF-8, as vqm-settings or another program may have written them) and works the
 // lists as the dialer does: the DialPad's count of unread messages and a location taken out of
-// "NewIdx" as the listing does. The settings store is in memory; each list operation
+// "NewIdx" as the listing does, and a new location added to "UnreadIdx". The settings store is in memory; each list operation
 // reads (and writes) it, which costs far more than the walk, so the target keeps to a few.
 #include <algorithm>
 #include <cstdint>
@@ -42,6 +42,17 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
         std::vector<int> expected = fresh;
         expected.erase(expected.begin() + (first - fresh.begin()));
         if (vqm::IndexListEntries(settings, vqm::kNewIdx) != expected) __builtin_trap();
+    }
+
+    // A new message's location joins "UnreadIdx" and is found there, whatever the list held
+    // (unless the list has no room left, which the store refuses).
+    const std::vector<int> unread = vqm::IndexListEntries(settings, vqm::kUnreadIdx);
+    const int highest = unread.empty() ? 0 : *std::max_element(unread.begin(), unread.end());
+    if (highest < 1000000) {
+        const int location = std::max(highest, 0) + 1;
+        if (vqm::IndexListAdd(settings, vqm::kUnreadIdx, location) == 1 &&
+            vqm::IndexListContains(settings, vqm::kUnreadIdx, location) != 1)
+            __builtin_trap();
     }
     return 0;
 }

@@ -93,6 +93,9 @@ bool ReadList(SettingsStore& settings, const char16_t* name, std::string* list) 
 }
 
 int WriteList(SettingsStore& settings, const char16_t* name, const std::string& list) {
+    // A list that does not fit is refused whole: cut, it would end in a damaged entry and lose
+    // the location just added.
+    if (list.size() > kMaxSettingLength) return 0;
     char16_t wide[kMaxSettingLength + 1];
     NarrowToWide(list.data(), wide, static_cast<int>(list.size()), sizeof wide / sizeof wide[0]);
     return SetSettingString(settings, name, wide);

@@ -240,6 +240,20 @@ TEST_F(MessageStoreTest, IndexListsKeepTheirQuotedForm) {
     EXPECT_EQ(List(kNewIdx), "");
     EXPECT_EQ(IndexListCount(settings_, kNewIdx), 0);
 
+    // A list with no room left refuses a location rather than keep part of it.
+    std::u16string full;
+    for (int location = 100; full.size() + 5 <= kMaxSettingLength; ++location)
+        full += u"\"" + Utf8ToUtf16(std::to_string(location)) + u"\"";
+    ASSERT_EQ(SetSettingString(settings_, kNewIdx, full.c_str()), 1);
+    const int count = IndexListCount(settings_, kNewIdx);
+    EXPECT_EQ(IndexListAdd(settings_, kNewIdx, 999), 0);
+    EXPECT_EQ(IndexListCount(settings_, kNewIdx), count);
+    EXPECT_EQ(IndexListAdd(settings_, kNewIdx, 100), 1);  // already there
+    ASSERT_EQ(IndexListRemove(settings_, kNewIdx, 100), 1);
+    EXPECT_EQ(IndexListAdd(settings_, kNewIdx, 999), 1);
+    EXPECT_EQ(IndexListContains(settings_, kNewIdx, 999), 1);
+    SetSettingString(settings_, kNewIdx, u"");
+
     // The unread count takes a location in both lists once.
     IndexListAdd(settings_, kNewIdx, 5);
     IndexListAdd(settings_, kUnreadIdx, 5);
