@@ -10,6 +10,7 @@
 #include "link/device_at.h"
 #include "link/link.h"
 #include "messaging/message_store.h"
+#include "messaging/sms_at.h"
 #include "settings/call_waiting_at.h"
 #include "support/local_socket.h"
 #include "support/settings_store.h"
@@ -172,10 +173,10 @@ int NewMessageLocation(const EventRecord& record, char* memory, size_t memorySiz
     return location;
 }
 
-int OnNewMessage(DialPad& pad, const EventRecord& record) {
+int OnNewMessage(DialPad& pad, const EventRecord& record, int simFull) {
     if (record.length < 7) return 0;
     SettingsStore& settings = pad.Settings();
-    SmsNoteNewMessage(settings, pad.LinkRef(), NewMessageLocation(record),
+    SmsNoteNewMessage(settings, simFull, NewMessageLocation(record),
                       [&pad](int full) { NotifySimFull(pad, full); });
     NotifyNewMessages(pad, 1, UnreadMessageCount(settings));
     return 0;
@@ -233,7 +234,10 @@ void InstallCallHandlers(UnsolicitedEvents& events, DialPad& pad,
         return 0;
     });
     events.SetHandler(kEventNewMessage, [&pad, onPadThread](const EventRecord& record) {
-        onPadThread([&] { OnNewMessage(pad, record); });
+        // A third of a second with the card: here, not on the pad's thread, which a burst of
+        // new messages would hold for seconds while a caller rings.
+        const int simFull = record.length < 7 ? 0 : SmsStorageFull(pad.LinkRef());
+        onPadThread([&] { OnNewMessage(pad, record, simFull); });
         return 0;
     });
     events.SetHandler(kEventCallWaiting, [&pad, onPadThread](const EventRecord& record) {

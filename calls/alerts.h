@@ -43,9 +43,11 @@ void ShowCaller(DialPad& pad, const char* number, int length);
 // they are. Outside a voice call the line means nothing and is ignored. Returns 0.
 int OnCallWaiting(DialPad& pad, const EventRecord& record);
 
-// "+CMTI:": the location joins the new messages (the full-SIM alert first when the SIM is full)
-// and the DialPad announces the unread count. Returns 0.
-int OnNewMessage(DialPad& pad, const EventRecord& record);
+// "+CMTI:": the location joins the new messages (the full-SIM alert first when simFull, the
+// card's SmsStorageFull answer, is 1) and the DialPad announces the unread count. The card is
+// asked by the dispatching thread: the DialPad's thread, the window's, never waits on it.
+// Returns 0.
+int OnNewMessage(DialPad& pad, const EventRecord& record, int simFull);
 // The location of a "+CMTI:" record: the integer after the quoted memory name and ",", -1 when
 // there is none; the memory name goes to memory when given.
 int NewMessageLocation(const EventRecord& record, char* memory = nullptr, size_t memorySize = 0);

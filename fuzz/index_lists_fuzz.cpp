@@ -1,8 +1,9 @@
 // Feeds arbitrary text to the "NewIdx" and "UnreadIdx" settings (split at the first NUL byte,
 // each read as UTF-8, as vqm-settings or another program may have written them) and works the
 // lists as the dialer does: the DialPad's count of unread messages and a location taken out of
-// "NewIdx" as the listing does, and a new location added to "UnreadIdx". The settings store is in memory; each list operation
-// reads (and writes) it, which costs far more than the walk, so the target keeps to a few.
+// "NewIdx" as the listing does, and a new location added to "UnreadIdx". The settings store is
+// in memory; each list operation reads (and writes) it, which costs far more than the walk, so
+// the target keeps to a few.
 #include <algorithm>
 #include <cstdint>
 #include <string>

@@ -195,8 +195,7 @@ int ParseVolumeReply(const char* reply, int length) {
     return cursor.SeekPast("+CLVL:") && cursor.NextInt(&level) ? level : -1;
 }
 
-int ParseCallListReply(const char* reply, int length, int* state, int* mode,
-                       std::string* number) {
+int ParseCallListReply(const char* reply, int length, int* state, int* mode, std::string* number) {
     FieldCursor cursor(reply, length);
     if (cursor.AtEnd()) return kCallListUnknown;
     bool ok = false;
@@ -329,8 +328,7 @@ int QueryCallState(Link& link, int* state, int* mode, std::string* number) {
     char reply[kReplySize];
     const int length = static_cast<int>(
         AtCommandWithin(link, "AT+CLCC\r", reply, sizeof reply, kQueryAnswerLimitMs));
-    return length == 0 ? kCallListUnknown
-                       : ParseCallListReply(reply, length, state, mode, number);
+    return length == 0 ? kCallListUnknown : ParseCallListReply(reply, length, state, mode, number);
 }
 
 }  // namespace vqm

@@ -402,14 +402,10 @@ int UnreadMessageCount(SettingsStore& settings) {
                                           [](int location) { return location > 0; }));
 }
 
-int SmsNoteNewMessage(SettingsStore& settings, Link& link, int location,
+int SmsNoteNewMessage(SettingsStore& settings, int simFull, int location,
                       const std::function<void(int full)>& simFullAlert) {
-    if (SmsStorageFull(link) == 1 && simFullAlert) simFullAlert(1);
+    if (simFull == 1 && simFullAlert) simFullAlert(1);
     return IndexListAdd(settings, kNewIdx, location);
-}
-
-int SmsNoteNewMessage(MessageStore& store, Link& link, int location) {
-    return SmsNoteNewMessage(store.settings, link, location, store.hooks.simFullAlert);
 }
 
 int SmsNoteNewMessageAgain(SettingsStore& settings, int location) {

@@ -142,10 +142,10 @@ std::vector<int> IndexListEntries(SettingsStore& settings, const char16_t* name)
 // Locations in either list, each counted once: the unread messages the DialPad announces.
 int UnreadMessageCount(SettingsStore& settings);
 
-// A "+CMTI:" location: the full-SIM alert first when the SIM is full, then the location joins
-// "NewIdx". The second form only queues the location again.
-int SmsNoteNewMessage(MessageStore& store, Link& link, int location);
-int SmsNoteNewMessage(SettingsStore& settings, Link& link, int location,
+// A "+CMTI:" location: the full-SIM alert first when simFull (SmsStorageFull's answer, asked
+// off the window's thread) is 1, then the location joins "NewIdx". The second form only queues
+// the location again.
+int SmsNoteNewMessage(SettingsStore& settings, int simFull, int location,
                       const std::function<void(int full)>& simFullAlert);
 int SmsNoteNewMessageAgain(SettingsStore& settings, int location);
 // Reads every "NewIdx" location into the transfer file and files it into the Inbox. 1 when

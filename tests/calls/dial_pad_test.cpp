@@ -14,10 +14,13 @@
 
 #include "calls/alerts.h"
 #include "calls/call_log.h"
+#include "calls/event_log.h"
 #include "calls/tones.h"
+#include "calls/unsolicited.h"
 #include "cardsim/card_sim.h"
 #include "contacts/phonebook_cache.h"
 #include "link/link.h"
+#include "messaging/message_store.h"
 #include "support/settings_store.h"
 #include "support/text.h"
 #include "tests/common/temp_folder.h"
@@ -266,6 +269,33 @@ class NoticeTest : public ::testing::Test {
     FakeUi ui_;
     DialPad pad_{link_, settings_, log_, caches_, ui_};
 };
+
+// Whether the SIM is full is asked of the card on the dispatching thread (the listener's), not
+// on the pad's, the window's: a burst of new messages held the window a third of a second each
+// while a caller rang. Here the pad's thread finds the card gone, so what it shows was asked
+// before.
+TEST_F(NoticeTest, ANewMessageAsksTheCardBeforeItReachesThePadsThread) {
+    cardsim::SimConfig config;
+    config.baud = 0;
+    cardsim::CardSim sim(config);
+    ASSERT_TRUE(sim.PowerUp());
+    // The SIM's own messages and a new one, in a memory of five places: full.
+    ASSERT_EQ(sim.Control("deliver +447700900123 Hello"), "OK");
+    ASSERT_EQ(sim.Control("capacity 5"), "OK");
+    ASSERT_EQ(PortOpenDevice(link_, sim.DevicePath().c_str()), 1);
+    EventLog queue(temp_ / "event.log");
+    UnsolicitedEvents events(queue);
+    InstallCallHandlers(events, pad_, [&](const std::function<void()>& work) {
+        PortClose(link_);
+        work();
+    });
+    static const char kNewMessage[] = "+CMTI: \"SM\",3";
+    events.DispatchEvent(MakeEventRecord(kEventNewMessage, kNewMessage,
+                                         kNewMessage + sizeof kNewMessage - 1,
+                                         std::chrono::system_clock::now()));
+    EXPECT_NE(Line().find(u"SIM Full"), std::u16string::npos) << Utf16ToUtf8(Line());
+    EXPECT_EQ(IndexListContains(settings_, kNewIdx, 3), 1);
+}
 
 TEST_F(NoticeTest, UnansweredCallsAreCountedAndAFullSimStaysNamedBesideThem) {
     NotifyUnansweredCall(pad_);

@@ -138,8 +138,8 @@ class PulledCardTest : public ::testing::TestWithParam<std::tuple<Exchange, cons
 TEST_P(PulledCardTest, TheDialerSaysTheCardIsGoneKeepsItsFilesWholeAndTakesItBack) {
     const Exchange& exchange = std::get<0>(GetParam());
     const std::string dialect = std::get<1>(GetParam());
-    ASSERT_NO_FATAL_FAILURE(StartCard("--dialect " + dialect + " --power-up-ms 500 " +
-                                      exchange.cardOptions));
+    ASSERT_NO_FATAL_FAILURE(
+        StartCard("--dialect " + dialect + " --power-up-ms 500 " + exchange.cardOptions));
     if (exchange.holdAt[0]) {
         ASSERT_EQ(Ctl(std::string("hold ") + exchange.holdAt).second, 0);
     }

@@ -464,12 +464,17 @@ TEST_F(MessageStoreCardTest, NewMessageIsNotedThenTakenInThroughTheTransferFile)
                         std::to_string(ClipboardCount(store_)));
     };
     store_.hooks.selectFirstUnread = [&] { calls.push_back("select"); };
+    // A "+CMTI:" as the DialPad takes it: the card asked whether the SIM is full, then noted.
+    auto NoteNew = [&](int location) {
+        return SmsNoteNewMessage(settings_, SmsStorageFull(link_), location,
+                                 store_.hooks.simFullAlert);
+    };
 
     EXPECT_EQ(SmsIntakeNew(store_, link_), 0);  // nothing announced
     EXPECT_TRUE(calls.empty());
 
     ASSERT_EQ(sim_->Control("deliver +447700900999 Hello there"), "OK");
-    ASSERT_EQ(SmsNoteNewMessage(store_, link_, 5), 1);
+    ASSERT_EQ(NoteNew(5), 1);
     EXPECT_TRUE(calls.empty());  // the SIM has room
     EXPECT_EQ(IndexListContains(settings_, kNewIdx, 5), 1);
 
@@ -484,7 +489,7 @@ TEST_F(MessageStoreCardTest, NewMessageIsNotedThenTakenInThroughTheTransferFile)
     // A full SIM raises its alert before the location is queued.
     ASSERT_EQ(sim_->Control("capacity 5"), "OK");
     calls.clear();
-    ASSERT_EQ(SmsNoteNewMessage(store_, link_, 5), 1);
+    ASSERT_EQ(NoteNew(5), 1);
     EXPECT_EQ(calls, std::vector<std::string>{"full1"});
 
     // A location the SIM cannot read stops the intake with the busy look taken off.
