@@ -1,6 +1,7 @@
 #include "calls/alerts.h"
 
 #include <cstdio>
+#include <memory>
 
 #include "calls/call_log.h"
 #include "calls/dial_pad.h"
@@ -223,6 +224,36 @@ void NotificationTapped(DialPad& pad) {
     }
 }
 
+namespace {
+
+// What the card last said of its SIM store, carried through a burst of new messages.
+struct SimFill {
+    int32_t used = -1, total = -1;
+};
+
+// Whether the SIM is full with one more new message. The card is asked for the first message of
+// a burst, and whenever the count comes to full (the alert is the card's word); each message
+// queued behind it takes one place more without asking, so that a burst of new messages does
+// not hold the listener, and a ring queued behind them, a third of a second each.
+int SimFullWithNewMessage(Link& link, SimFill& fill, bool moreQueued) {
+    int full = 0;
+    if (fill.total > 0 && fill.used + 1 < fill.total) {
+        ++fill.used;
+    } else {
+        int32_t used = 0, total = 0;
+        if (SmsSelectSimStorage(link, &used, &total)) {
+            fill = {used, total};
+            full = used == total ? 1 : 0;
+        } else {
+            fill = {};
+        }
+    }
+    if (!moreQueued) fill = {};  // the burst is over: the next message asks afresh
+    return full;
+}
+
+}  // namespace
+
 void InstallCallHandlers(UnsolicitedEvents& events, DialPad& pad,
                          std::function<void(const std::function<void()>&)> onPadThread) {
     events.SetHandler(kEventRing, [&pad, onPadThread](const EventRecord& record) {
@@ -233,13 +264,18 @@ void InstallCallHandlers(UnsolicitedEvents& events, DialPad& pad,
         onPadThread([&] { OnCallerId(pad, record); });
         return 0;
     });
-    events.SetHandler(kEventNewMessage, [&pad, onPadThread](const EventRecord& record) {
-        // A third of a second with the card: here, not on the pad's thread, which a burst of
-        // new messages would hold for seconds while a caller rings.
-        const int simFull = record.length < 7 ? 0 : SmsStorageFull(pad.LinkRef());
-        onPadThread([&] { OnNewMessage(pad, record, simFull); });
-        return 0;
-    });
+    // One dispatcher at a time hands records over, so the fill needs no lock.
+    auto fill = std::make_shared<SimFill>();
+    events.SetHandler(
+        kEventNewMessage, [&pad, &events, fill, onPadThread](const EventRecord& record) {
+            // The card is asked here, not on the pad's thread, the window's. The record being
+            // handed over is still in the queue: more than one means more are waiting.
+            const bool moreQueued = events.Log().EventLogCount() > 1;
+            const int simFull =
+                record.length < 7 ? 0 : SimFullWithNewMessage(pad.LinkRef(), *fill, moreQueued);
+            onPadThread([&] { OnNewMessage(pad, record, simFull); });
+            return 0;
+        });
     events.SetHandler(kEventCallWaiting, [&pad, onPadThread](const EventRecord& record) {
         onPadThread([&] { OnCallWaiting(pad, record); });
         return 0;

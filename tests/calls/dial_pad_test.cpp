@@ -4,11 +4,13 @@
 
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <chrono>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <map>
+#include <mutex>
 #include <thread>
 #include <vector>
 
@@ -23,6 +25,8 @@
 #include "messaging/message_store.h"
 #include "support/settings_store.h"
 #include "support/text.h"
+#include "tests/common/fake_card.h"
+#include "tests/common/link_waits.h"
 #include "tests/common/temp_folder.h"
 #include "tests/common/wait.h"
 
@@ -151,7 +155,8 @@ TEST_F(DialExchangeTest, OldFirmwareWaitsForTheCardsAnswerDespiteACancel) {
     const bool dialling = Dialling();
     cancel_.store(1);
     // Still waiting: the dial does not end within 400 ms of the cancel.
-    const bool endedEarly = testing::WaitFor([&] { return result_.load() != -2; }, milliseconds(400));
+    const bool endedEarly =
+        testing::WaitFor([&] { return result_.load() != -2; }, milliseconds(400));
     const std::string answered = sim_->Control("remote-answer");
     dial.join();
     ASSERT_TRUE(dialling);
@@ -295,6 +300,55 @@ TEST_F(NoticeTest, ANewMessageAsksTheCardBeforeItReachesThePadsThread) {
                                          std::chrono::system_clock::now()));
     EXPECT_NE(Line().find(u"SIM Full"), std::u16string::npos) << Utf16ToUtf8(Line());
     EXPECT_EQ(IndexListContains(settings_, kNewIdx, 3), 1);
+}
+
+// A burst of new messages asks the card once whether the SIM is full, and again only when the
+// places counted since come to full; a message after the burst asks afresh.
+TEST_F(NoticeTest, ABurstOfNewMessagesAsksTheCardOnceUnlessItFills) {
+    // The places the card reports taken, one answer per question (the last one stays).
+    std::mutex mutex;
+    std::vector<int> answers = {5};
+    int asked = 0;
+    testing::FakeCard card([&](const std::string& command) -> std::string {
+        if (command.rfind("AT+CPMS=", 0) != 0) return "\r\nOK\r\n";
+        std::lock_guard<std::mutex> lock(mutex);
+        ++asked;
+        const std::string used = std::to_string(answers.front());
+        if (answers.size() > 1) answers.erase(answers.begin());
+        return "\r\n+CPMS: " + used + ",10," + used + ",10," + used + ",10\r\n\r\nOK\r\n";
+    });
+    testing::ShortenLinkWaits(link_);
+    ASSERT_EQ(PortOpenDevice(link_, card.Device().c_str()), 1);
+    EventLog queue(temp_ / "event.log");
+    UnsolicitedEvents events(queue);
+    InstallCallHandlers(events, pad_, [](const std::function<void()>& work) { work(); });
+    auto burst = [&](std::initializer_list<int> locations, std::vector<int> replies) {
+        {
+            std::lock_guard<std::mutex> lock(mutex);
+            answers = std::move(replies);
+            asked = 0;
+        }
+        for (int location : locations) {
+            const std::string line = "+CMTI: \"SM\"," + std::to_string(location);
+            queue.EventLogAppend(MakeEventRecord(kEventNewMessage, line.data(),
+                                                 line.data() + line.size(),
+                                                 std::chrono::system_clock::now()));
+        }
+        events.DispatchQueued();
+        std::lock_guard<std::mutex> lock(mutex);
+        return asked;
+    };
+    // Three new messages in a store of ten with five taken: asked once, no alert.
+    EXPECT_EQ(burst({3, 4, 5}, {5}), 1);
+    EXPECT_EQ(Line().find(u"SIM Full"), std::u16string::npos) << Utf16ToUtf8(Line());
+    // Five more, the last three still arriving when the card is first asked (eight taken): the
+    // count comes to ten at the third, where the card is asked again and says full, and so on.
+    EXPECT_EQ(burst({6, 7, 8, 9, 10}, {8, 10}), 4);
+    EXPECT_NE(Line().find(u"SIM Full"), std::u16string::npos) << Utf16ToUtf8(Line());
+    EXPECT_EQ(IndexListCount(settings_, kNewIdx), 8);
+    // After the burst a new message asks afresh.
+    EXPECT_EQ(burst({11}, {9}), 1);
+    PortClose(link_);
 }
 
 TEST_F(NoticeTest, UnansweredCallsAreCountedAndAFullSimStaysNamedBesideThem) {
